@@ -6,11 +6,13 @@
 #include <cstdlib>
 
 #include "cache/module_cache.h"
+#include "modules/module_factory.h"
 #include "platform/dictionary.h"
 #include "platform/file_io.h"
 #include "platform/log.h"
 #include "platform/property_list.h"
 #include "platform/string.h"
+#include "tool/discovery.h"
 
 namespace qr {
 
@@ -20,12 +22,24 @@ const char kCachewrightUsage[] =
 
 namespace {
 
+constexpr int kMaxDiscoveryDepth = 200;
+
 // Path mode: exactly one word after the program name, and it begins with "/".
 bool isPathMode(int argc, char** argv) { return argc == 2 && argv[1][0] == '/'; }
 
-// Discovery and the module queries fill the cache here, between preparing it
-// and writing it.
-void askModules() {}
+// Finds the installed modules and asks each what it offers; the answers land
+// in the cache. The hosts, and with them every module, go when this returns.
+void askModules() {
+  auto pmHost = make<PMHost>();
+  auto iomHost = make<IOMHost>();
+  auto pbmHost = make<PBMHost>();
+  QuarrinModuleFactory::resetLoadFailures();
+  discoverModules(kMaxDiscoveryDepth, *pmHost, *iomHost, *pbmHost);
+  for (const auto& item : *iomHost->connectionInfoList()) {
+    auto* record = cast<ConnectionInfo>(item.get());
+    if (record && record->connectionType()) pmHost->GetLookupInfoList(*record->connectionType());
+  }
+}
 
 // Serialises before opening the file, so a value that cannot be written
 // never leaves a truncated file behind.
