@@ -1,5 +1,5 @@
 // JPEG through libjpeg-turbo, to RGBA with opaque alpha. A file that ends
-// early is refused (the library would pad it with grey and only warn).
+// early is refused at once (the library would pad it with grey and only warn).
 #include <cstdio>  // jpeglib.h needs FILE and size_t first
 // clang-format off
 #include <jpeglib.h>
@@ -23,7 +23,6 @@ struct JpegSession {
   jpeg_error_mgr errors;
   jpeg_progress_mgr progress;
   std::jmp_buf jump;
-  bool endedEarly;
   bool created;
 };
 
@@ -35,7 +34,7 @@ JpegSession& sessionOf(j_common_ptr info) {
 [[noreturn]] void onError(j_common_ptr info) { std::longjmp(sessionOf(info).jump, 1); }
 
 void onMessage(j_common_ptr info, int level) {
-  if (level < 0 && info->err->msg_code == JWRN_JPEG_EOF) sessionOf(info).endedEarly = true;
+  if (level < 0 && info->err->msg_code == JWRN_JPEG_EOF) onError(info);
 }
 
 void onOutput(j_common_ptr) {}
@@ -67,7 +66,7 @@ bool readRows(JpegSession& s, RasterImage& out) {
     JSAMPROW row = out.row(s.info.output_scanline);
     if (jpeg_read_scanlines(&s.info, &row, 1) != 1) return false;
   }
-  return !s.endedEarly;
+  return true;
 }
 
 // CMYK as Adobe writes it holds inverted inks; other writers store them plain.
