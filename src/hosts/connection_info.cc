@@ -1,5 +1,6 @@
 #include "hosts/connection_info.h"
 
+#include <unicode/uchar.h>
 #include <unicode/ustring.h>
 
 #include "modules/module_factory.h"
