@@ -114,7 +114,7 @@ TEST_F(Discovery, ExclusionsCompareWholePathsAndPatternsMatchAcrossSlashes) {
   // A search root spelled with a trailing slash is not the excluded path.
   forgetDiscoverySettings();
   settings({root + "/Foo/"}, {root + "/Foo"});
-  EXPECT_EQ(discover().pm, Paths{root + "/Foo//A.plugin"});
+  EXPECT_EQ(discover().pm, Paths{root + "/Foo/A.plugin"});
 }
 
 TEST_F(Discovery, TheDepthLimitSkipsDirectoriesAtMaxLevel) {
