@@ -48,16 +48,16 @@ extern "C" {
 /* ---- Values ---------------------------------------------------------- */
 
 /* Any value. Every other handle converts to it without a cast. */
-typedef const void *QrTypeRef;
-typedef const struct QrOpaqueString *QrStringRef;
-typedef const struct QrOpaqueArray *QrArrayRef;
-typedef struct QrOpaqueArray *QrMutableArrayRef;
-typedef const struct QrOpaqueDictionary *QrDictionaryRef;
-typedef struct QrOpaqueDictionary *QrMutableDictionaryRef;
-typedef const struct QrOpaqueData *QrDataRef;
-typedef const struct QrOpaqueNumber *QrNumberRef;
-typedef const struct QrOpaqueBoolean *QrBooleanRef;
-typedef const struct QrOpaqueUUID *QrUUIDRef;
+typedef const void* QrTypeRef;
+typedef const struct QrOpaqueString* QrStringRef;
+typedef const struct QrOpaqueArray* QrArrayRef;
+typedef struct QrOpaqueArray* QrMutableArrayRef;
+typedef const struct QrOpaqueDictionary* QrDictionaryRef;
+typedef struct QrOpaqueDictionary* QrMutableDictionaryRef;
+typedef const struct QrOpaqueData* QrDataRef;
+typedef const struct QrOpaqueNumber* QrNumberRef;
+typedef const struct QrOpaqueBoolean* QrBooleanRef;
+typedef const struct QrOpaqueUUID* QrUUIDRef;
 
 /* What a value is, for values read from property lists and collections. */
 typedef enum QrValueKind {
@@ -82,9 +82,9 @@ QR_API bool QrEqual(QrTypeRef a, QrTypeRef b);
 QR_API QrValueKind QrGetKind(QrTypeRef value);
 
 /* NULL when the text is not well-formed UTF-8. */
-QR_API QrStringRef QrStringCreateWithUTF8(const char *utf8);
+QR_API QrStringRef QrStringCreateWithUTF8(const char* utf8);
 /* A malloc'ed, NUL-terminated UTF-8 copy that the caller frees. */
-QR_API char *QrStringCopyUTF8(QrStringRef string);
+QR_API char* QrStringCopyUTF8(QrStringRef string);
 /* The length in UTF-16 code units. */
 QR_API size_t QrStringGetLength(QrStringRef string);
 
@@ -98,8 +98,7 @@ QR_API QrTypeRef QrArrayGetValueAtIndex(QrArrayRef array, size_t index);
 QR_API QrMutableDictionaryRef QrDictionaryCreateMutable(void);
 /* Adds or replaces; the dictionary keeps its own references. A NULL key or
  * value changes nothing. */
-QR_API void QrDictionarySetValue(QrMutableDictionaryRef dictionary, QrTypeRef key,
-                                 QrTypeRef value);
+QR_API void QrDictionarySetValue(QrMutableDictionaryRef dictionary, QrTypeRef key, QrTypeRef value);
 QR_API QrTypeRef QrDictionaryGetValue(QrDictionaryRef dictionary, QrTypeRef key);
 QR_API size_t QrDictionaryGetCount(QrDictionaryRef dictionary);
 
@@ -107,20 +106,20 @@ QR_API QrNumberRef QrNumberCreateInt64(int64_t value);
 QR_API QrNumberRef QrNumberCreateDouble(double value);
 /* Stores the value (reals truncated toward zero) and returns whether it
  * fits an int64_t exactly. */
-QR_API bool QrNumberGetInt64(QrNumberRef number, int64_t *value);
+QR_API bool QrNumberGetInt64(QrNumberRef number, int64_t* value);
 
 /* The two boolean values; they live for the whole process. */
 QR_API QrBooleanRef QrBooleanGetTrue(void);
 QR_API QrBooleanRef QrBooleanGetFalse(void);
 
 /* Copies the bytes. bytes may be NULL only when length is 0. */
-QR_API QrDataRef QrDataCreate(const uint8_t *bytes, size_t length);
-QR_API const uint8_t *QrDataGetBytes(QrDataRef data);
+QR_API QrDataRef QrDataCreate(const uint8_t* bytes, size_t length);
+QR_API const uint8_t* QrDataGetBytes(QrDataRef data);
 QR_API size_t QrDataGetLength(QrDataRef data);
 
 /* Reads an XML, binary or text-format property list; NULL on any failure.
  * The result and everything in it is immutable. */
-QR_API QrTypeRef QrPropertyListCreateFromFile(const char *path);
+QR_API QrTypeRef QrPropertyListCreateFromFile(const char* path);
 
 /* ---- UUIDs ----------------------------------------------------------- */
 
@@ -130,7 +129,7 @@ typedef struct QrUUIDBytes {
 } QrUUIDBytes;
 
 /* "XXXXXXXX-XXXX-XXXX-XXXX-XXXXXXXXXXXX" in either case; NULL if malformed. */
-QR_API QrUUIDRef QrUUIDCreateFromString(const char *text);
+QR_API QrUUIDRef QrUUIDCreateFromString(const char* text);
 QR_API QrUUIDRef QrUUIDCreateFromBytes(QrUUIDBytes bytes);
 /* All zero for NULL. */
 QR_API QrUUIDBytes QrUUIDGetBytes(QrUUIDRef uuid);
@@ -148,7 +147,7 @@ QR_API QrUUIDBytes QrUUIDGetBytes(QrUUIDRef uuid);
 /* Raises the platform exception (name, reason) from plug-in code; the host
  * catches it at the call into the plug-in. Never returns. C code that raises
  * must be built with -fexceptions. */
-QR_API QR_NORETURN void QrRaise(const char *name, const char *reason);
+QR_API QR_NORETURN void QrRaise(const char* name, const char* reason);
 
 /* ---- Instances and interfaces ---------------------------------------- */
 
@@ -158,7 +157,7 @@ QR_API QR_NORETURN void QrRaise(const char *name, const char *reason);
 
 /* A factory named in CFPlugInFactories. allocator is always NULL. Returns an
  * instance carrying one reference for the caller, or NULL. */
-typedef void *(*QrPlugInFactoryFunction)(void *allocator, QrUUIDRef typeID);
+typedef void* (*QrPlugInFactoryFunction)(void* allocator, QrUUIDRef typeID);
 
 /* An instance is a pointer to an object whose first member points to a
  * QrIUnknownVTbl:
@@ -170,10 +169,10 @@ typedef void *(*QrPlugInFactoryFunction)(void *allocator, QrUUIDRef typeID);
  * The host calls QueryInterface once and Release once per instance and keeps
  * the interface for the rest of the process. */
 typedef struct QrIUnknownVTbl {
-  void *reserved;
-  int32_t (*QueryInterface)(void *instance, QrUUIDBytes iid, void **out);
-  uint32_t (*AddRef)(void *instance);
-  uint32_t (*Release)(void *instance);
+  void* reserved;
+  int32_t (*QueryInterface)(void* instance, QrUUIDBytes iid, void** out);
+  uint32_t (*AddRef)(void* instance);
+  uint32_t (*Release)(void* instance);
 } QrIUnknownVTbl;
 
 /* The I/O module interface (QR_IOM_INTERFACE_ID): a pointer to an object
@@ -181,10 +180,10 @@ typedef struct QrIUnknownVTbl {
  * GetConnectionInfo fills either, both or neither reference and returns 0 on
  * success; the strings stay the plug-in's (the host takes its own reference). */
 typedef struct QrIOModuleVTbl {
-  void *reserved0;
-  void *reserved1;
-  void *reserved2;
-  int32_t (*GetConnectionInfo)(QrStringRef *connectionType, QrStringRef *pbmPath);
+  void* reserved0;
+  void* reserved1;
+  void* reserved2;
+  int32_t (*GetConnectionInfo)(QrStringRef* connectionType, QrStringRef* pbmPath);
 } QrIOModuleVTbl;
 
 /* The printer module interface (QR_PM_INTERFACE_ID): a pointer to an object
@@ -192,21 +191,21 @@ typedef struct QrIOModuleVTbl {
  * to NULL or to a new array of browser-info dictionaries, which the caller
  * releases. Its result is not looked at. */
 typedef struct QrPrinterModuleVTbl {
-  void *reserved0;
-  void *reserved1;
-  void *reserved2;
-  int32_t (*CreateBrowserInfo)(QrStringRef connectionType, QrArrayRef *browserInfo);
+  void* reserved0;
+  void* reserved1;
+  void* reserved2;
+  int32_t (*CreateBrowserInfo)(QrStringRef connectionType, QrArrayRef* browserInfo);
 } QrPrinterModuleVTbl;
 
-/* Hands out lookup spec `index` (from 0) of the browser's connection type as
+/* Hands out lookup dictionary `index` (from 0) of the browser's connection type as
  * a new dictionary that the browser releases. refCon is the value the
  * browser received in Initialize. Returns 0 or a negative status. */
-typedef int32_t (*PMPrBrowserGetLookupSpecProc)(void *refCon, uint32_t index,
-                                                QrDictionaryRef *lookupSpec);
+typedef int32_t (*PMPrBrowserGetLookupSpecProc)(void* refCon, uint32_t index,
+                                                QrDictionaryRef* lookupSpec);
 /* The client's own functions: the host only stores them, so their use is an
  * agreement between a browser and its client. */
-typedef int32_t (*PMPrBrowserSyncRequestProc)(void *refCon);
-typedef int32_t (*PMPrBrowserSelStatusProc)(void *refCon, bool printersSelected);
+typedef int32_t (*PMPrBrowserSyncRequestProc)(void* refCon);
+typedef int32_t (*PMPrBrowserSelStatusProc)(void* refCon, bool printersSelected);
 
 /* Given to the browser's Initialize entry; lives until the module goes away. */
 typedef struct PMPrBrowserCallbacks {
@@ -221,22 +220,22 @@ typedef struct PMPrBrowserCallbacks {
  * that the host passes on unchanged; context is the value Prologue stored.
  * Entries marked reserved are never called. */
 typedef struct QrBrowserModuleVTbl {
-  void *reserved0;
-  void *reserved1;
-  void *reserved2;
-  void *reserved3;
+  void* reserved0;
+  void* reserved1;
+  void* reserved2;
+  void* reserved3;
   /* Sets *printers to the selected printers. */
-  int32_t (*GetSelectedPrinters)(uint32_t context, QrArrayRef *printers);
+  int32_t (*GetSelectedPrinters)(uint32_t context, QrArrayRef* printers);
   /* refCon goes back to callbacks->getLookupSpec; userPane is the client's
-   * opaque pane; numLookupSpecs counts the specs getLookupSpec serves. */
-  int32_t (*Initialize)(uint32_t context, void *refCon, const PMPrBrowserCallbacks *callbacks,
-                        void *userPane, uint32_t numLookupSpecs);
+   * opaque pane; numLookupSpecs counts the dictionaries getLookupSpec serves. */
+  int32_t (*Initialize)(uint32_t context, void* refCon, const PMPrBrowserCallbacks* callbacks,
+                        void* userPane, uint32_t numLookupSpecs);
   /* Stores the browser's context, its title (which stays the browser's, as
    * with GetConnectionInfo) and the pane's size limits. A host that wants
    * only the title passes flags 1. */
-  int32_t (*Prologue)(uint32_t *context, uint32_t flags, QrStringRef *title, uint32_t *minH,
-                      uint32_t *minV, uint32_t *maxH, uint32_t *maxV);
-  void *reserved7;
+  int32_t (*Prologue)(uint32_t* context, uint32_t flags, QrStringRef* title, uint32_t* minH,
+                      uint32_t* minV, uint32_t* maxH, uint32_t* maxV);
+  void* reserved7;
   int32_t (*Sync)(uint32_t context);
   int32_t (*Terminate)(uint32_t context, int32_t status);
 } QrBrowserModuleVTbl;

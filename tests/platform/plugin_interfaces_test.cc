@@ -35,12 +35,12 @@ void* interfaceOf(const char* fixture, const char* type, const char* interfaceID
 }
 
 // Serves two lookup specs; refCon must be the value handed to Initialize.
-int32_t serveLookupSpec(void* refCon, uint32_t index, QrDictionaryRef* spec) {
+int32_t serveLookupSpec(void* refCon, uint32_t index, QrDictionaryRef* lookup) {
   if (refCon != &serveLookupSpec) return -9540;
   if (index >= 2) return -30882;
   auto d = make<MutableDictionary>();
   d->set("connectionType", String::make(index == 0 ? "USB" : "DNSSD"));
-  *spec = leakToC<QrDictionaryRef>(d);
+  *lookup = leakToC<QrDictionaryRef>(d);
   return 0;
 }
 
