@@ -6,6 +6,7 @@
 #include "modules/module_factory.h"
 #include "modules/pbm_module.h"
 #include "platform/bundle.h"
+#include "platform/c_bridge.h"
 #include "platform/file_io.h"
 
 namespace qr {
@@ -61,8 +62,7 @@ Ref<String> ConnectionInfo::connectionTitle() {
                                                    nullptr, nullptr, nullptr, nullptr, &title);
       if (status == 0) {
         // The title stays the browser's; the record keeps its own reference.
-        auto* object = reinterpret_cast<Object*>(const_cast<QrOpaqueString*>(title));
-        setConnectionTitle(cast<String>(Ref<Object>(object)));
+        setConnectionTitle(Ref<String>(fromCAs<String>(title)));
         answered = true;
       }
     }

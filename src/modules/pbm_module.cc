@@ -5,6 +5,7 @@
 #include "hosts/pm_host.h"
 #include "modules/module_factory.h"
 #include "modules/plugin_guard.h"
+#include "platform/c_bridge.h"
 #include "platform/log.h"
 
 namespace qr {
@@ -116,7 +117,7 @@ int32_t PBMModule::defaultGetLookupSpec(void* refCon, uint32_t index, QrDictiona
     if (!item) return kPBMBadIndex;
     Ref<Dictionary> copy = item->copyLookupInfoDict();
     if (!copy) return kPBMNoList;
-    *lookupSpec = reinterpret_cast<QrDictionaryRef>(static_cast<Object*>(copy.leak()));
+    *lookupSpec = leakToC<QrDictionaryRef>(std::move(copy));
     return 0;
   } catch (...) {
     return kPBMNoList;

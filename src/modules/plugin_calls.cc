@@ -4,6 +4,8 @@
 
 #include <cstring>
 
+#include "platform/c_bridge.h"
+
 namespace qr::plugin_calls {
 namespace {
 
@@ -12,12 +14,8 @@ const VTable* tableOf(void* object) {
   return *static_cast<const VTable* const*>(object);
 }
 
-Ref<String> adoptString(QrStringRef ref, bool owned) {
-  auto* object = reinterpret_cast<Object*>(const_cast<QrOpaqueString*>(ref));
-  if (!object) return nullptr;
-  Ref<Object> held = owned ? Ref<Object>::adopt(object) : Ref<Object>(object);
-  return cast<String>(held);
-}
+// The plug-in keeps its strings; the caller takes its own reference.
+Ref<String> lentString(QrStringRef ref) { return Ref<String>(fromCAs<String>(ref)); }
 
 }  // namespace
 
@@ -38,8 +36,8 @@ int32_t getConnectionInfo(void* interface, Ref<String>* connectionType, Ref<Stri
     Ref<String>* typeOut;
     Ref<String>* pathOut;
     ~Deliver() {
-      *typeOut = adoptString(type, false);
-      *pathOut = adoptString(path, false);
+      *typeOut = lentString(type);
+      *pathOut = lentString(path);
     }
   } deliver{type, path, connectionType, pbmPath};
   return tableOf<QrIOModuleVTbl>(interface)->GetConnectionInfo(&type, &path);
@@ -47,11 +45,9 @@ int32_t getConnectionInfo(void* interface, Ref<String>* connectionType, Ref<Stri
 
 Ref<Array> createBrowserInfo(void* interface, const String& connectionType) {
   QrArrayRef info = nullptr;
-  auto type = reinterpret_cast<QrStringRef>(static_cast<const Object*>(&connectionType));
-  tableOf<QrPrinterModuleVTbl>(interface)->CreateBrowserInfo(type, &info);
-  auto* object = reinterpret_cast<Object*>(const_cast<QrOpaqueArray*>(info));
-  if (!object) return nullptr;
-  return cast<Array>(Ref<Object>::adopt(object));
+  tableOf<QrPrinterModuleVTbl>(interface)->CreateBrowserInfo(toC<QrStringRef>(&connectionType),
+                                                              &info);
+  return adoptFromC<Array>(info);
 }
 
 }  // namespace qr::plugin_calls
