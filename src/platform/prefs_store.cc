@@ -122,7 +122,9 @@ std::string temporaryPrefix(const std::string& target) {
 
 void removeStaleTemporaries(const std::string& store) {
   std::string dir = directoryOf(store);
-  std::string prefix = "." + baseNameOf(store) + ".";
+  std::string prefix(1, '.');  // built by appending: GCC 12 misreads "." + name as overlapping
+  prefix += baseNameOf(store);
+  prefix += '.';
   DIR* d = ::opendir(dir.c_str());
   if (!d) return;
   while (dirent* entry = ::readdir(d)) {

@@ -12,8 +12,9 @@
 
 namespace qr {
 
-// A hostile header can claim any size; an icon is far below these.
-constexpr uint64_t kMaxImagePixels = uint64_t(64) << 20;
+// A hostile header can claim any size; an icon is far below these. At the
+// pixel limit the decoded image takes 64 MiB and converts in about a second.
+constexpr uint64_t kMaxImagePixels = uint64_t(16) << 20;
 constexpr uint32_t kMaxImageSide = 1u << 16;
 constexpr size_t kMaxImageFileSize = size_t(256) << 20;
 

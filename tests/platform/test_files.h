@@ -2,6 +2,7 @@
 #pragma once
 
 #include <stdlib.h>
+#include <unistd.h>
 
 #include <filesystem>
 #include <optional>
@@ -14,8 +15,8 @@ namespace qr::testing {
 
 class TempDir {
  public:
-  TempDir() {
-    std::string pattern = (std::filesystem::temp_directory_path() / "quarrin-test-XXXXXX").string();
+  explicit TempDir(const std::filesystem::path& base = std::filesystem::temp_directory_path()) {
+    std::string pattern = (base / "quarrin-test-XXXXXX").string();
     if (!::mkdtemp(pattern.data())) std::abort();
     path_ = pattern;
   }
@@ -40,6 +41,15 @@ class TempDir {
  private:
   std::string path_;
 };
+
+// Memory-backed scratch space where there is some: tests that sync files
+// thousands of times run the same code there without waiting for a disk.
+inline std::filesystem::path memoryBackedTempBase() {
+  std::error_code error;
+  if (std::filesystem::is_directory("/dev/shm", error) && ::access("/dev/shm", W_OK) == 0)
+    return "/dev/shm";
+  return std::filesystem::temp_directory_path();
+}
 
 // Sets or unsets environment variables and restores them on destruction.
 class EnvGuard {
