@@ -234,8 +234,11 @@ TEST_F(PrefsStore, WriterKilledAtAnyMomentLeavesTheOldOrTheNewStore) {
   std::mt19937 random(12345);
   int64_t lastCounter = 0;
   int kills = 0, advanced = 0;
-  auto until = std::chrono::steady_clock::now() + std::chrono::seconds(4);
-  while (std::chrono::steady_clock::now() < until) {
+  // Run for a few seconds, longer on a busy machine until some writes got through.
+  auto start = std::chrono::steady_clock::now();
+  auto elapsed = [&] { return std::chrono::steady_clock::now() - start; };
+  while (elapsed() < std::chrono::seconds(4) ||
+         (advanced < 3 && elapsed() < std::chrono::seconds(30))) {
     pid_t writer = spawn([&] {
       for (;;) {
         auto n = counterIn(storedDictionary());
