@@ -48,7 +48,10 @@ std::string binaryPrinters(uint32_t n) {
     objects.push_back(counted(0xD, 2) + bigEndian(1, 4) + bigEndian(2, 4) + bigEndian(dict + 1, 4) +
                       bigEndian(dict + 2, 4));
     objects.push_back(counted(0x5, name.size()) + name);
-    objects.push_back("\x13" + bigEndian(i, 8));
+    // Appended rather than "\x13" + ...: GCC 12 at -O3 misreads that as an overlapping copy.
+    std::string integer(1, '\x13');
+    integer += bigEndian(i, 8);
+    objects.push_back(integer);
   }
   objects[0] = top;
   return bplist(objects);
