@@ -65,14 +65,45 @@ bool makeDirectories(const std::string& dir) {
   return isDirectory(dir);
 }
 
+// The last store this process parsed, with the bytes it came from. One run
+// reads the store several times (the discovery switch, the module cache, the
+// writer's fresh read under the lock), and a store holding the cache of
+// thousands of modules takes far longer to parse than to read: a read that
+// finds the same bytes takes the dictionary parsed before. Equal bytes are
+// the test, not file stamps, so no change to the file can go unseen.
+class ParsedStoreMemo {
+ public:
+  Ref<Dictionary> find(const std::string& path, const std::string& bytes) {
+    std::lock_guard<std::mutex> lock(mutex_);
+    return path == path_ && bytes == bytes_ ? dictionary_ : nullptr;
+  }
+  void remember(const std::string& path, const std::string& bytes, Ref<Dictionary> dictionary) {
+    std::lock_guard<std::mutex> lock(mutex_);
+    path_ = path;
+    bytes_ = bytes;
+    dictionary_ = std::move(dictionary);
+  }
+
+ private:
+  std::mutex mutex_;
+  std::string path_;
+  std::string bytes_;
+  Ref<Dictionary> dictionary_;  // immutable, so it can be handed to every reader
+};
+
+ParsedStoreMemo& parsedStoreMemo() {
+  static ParsedStoreMemo* memo = new ParsedStoreMemo;  // used until the very end
+  return *memo;
+}
+
 struct StoreContents {
   enum class Status { Missing, Parsed, Corrupt, Unreadable } status = Status::Missing;
   int error = 0;
   std::string bytes;
-  Ref<Dictionary> dictionary;
+  Ref<Dictionary> dictionary;  // immutable
 };
 
-StoreContents readStore(const std::string& path, Mutability mutability) {
+StoreContents readStore(const std::string& path) {
   StoreContents contents;
   int fd = ::open(path.c_str(), O_RDONLY | O_CLOEXEC);
   if (fd < 0) {
@@ -95,7 +126,11 @@ StoreContents readStore(const std::string& path, Mutability mutability) {
         "Cannot read the printing-preferences store " + path + ": " + errorText(contents.error));
     return contents;
   }
-  contents.dictionary = cast<Dictionary>(readPropertyList(contents.bytes, mutability));
+  contents.dictionary = parsedStoreMemo().find(path, contents.bytes);
+  if (!contents.dictionary) {
+    contents.dictionary = cast<Dictionary>(readPropertyList(contents.bytes));
+    if (contents.dictionary) parsedStoreMemo().remember(path, contents.bytes, contents.dictionary);
+  }
   if (!contents.dictionary) {
     contents.status = StoreContents::Status::Corrupt;
     logOnce(path, "corrupt",
@@ -107,8 +142,8 @@ StoreContents readStore(const std::string& path, Mutability mutability) {
   return contents;
 }
 
-Ref<Object> readPreference(const String& key, Mutability mutability) {
-  StoreContents contents = readStore(prefsStorePath(), mutability);
+Ref<Object> readPreference(const String& key) {
+  StoreContents contents = readStore(prefsStorePath());
   if (!contents.dictionary) return nullptr;
   return Ref<Object>(contents.dictionary->get(key));
 }
@@ -223,12 +258,14 @@ std::string prefsStorePath() {
 }
 
 Ref<String> copyStringPrintingPref(const String& key, int /*domain*/) {
-  return cast<String>(readPreference(key, Mutability::Immutable));
+  // Strings are immutable, so the parsed store's own serves as the caller's.
+  return cast<String>(readPreference(key));
 }
 
 Ref<MutableDictionary> copyDictionaryPrintingPref(const String& key, int /*domain*/) {
-  // Every read parses the file afresh, so the value is already the caller's own.
-  return cast<MutableDictionary>(readPreference(key, Mutability::MutableContainers));
+  Ref<Dictionary> value = cast<Dictionary>(readPreference(key));
+  if (!value) return nullptr;
+  return cast<MutableDictionary>(deepCopy(*value, Mutability::MutableContainers));
 }
 
 void setPrintingPref(const String& key, const Object& value, int /*domain*/) {
@@ -248,7 +285,7 @@ void setPrintingPref(const String& key, const Object& value, int /*domain*/) {
   if (!lock.held()) return;
   removeStaleTemporaries(store);
 
-  StoreContents current = readStore(store, Mutability::Immutable);
+  StoreContents current = readStore(store);
   Ref<MutableDictionary> dictionary;
   switch (current.status) {
     case StoreContents::Status::Unreadable:
@@ -276,6 +313,9 @@ void setPrintingPref(const String& key, const Object& value, int /*domain*/) {
     log("Printing preference %@ not stored: cannot write %s as a property list", &key, store);
     return;
   }
+  // A store that already holds exactly these bytes is left as it is: a
+  // rewrite would change nothing but cost a sync of the whole file.
+  if (current.status == StoreContents::Status::Parsed && *xml == current.bytes) return;
   replaceFile(store, *xml, existingModeOr(store, kStoreMode));
 }
 

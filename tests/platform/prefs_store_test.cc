@@ -127,6 +127,38 @@ TEST_F(PrefsStore, ValuesOfTheWrongKindReadAsNoneAndCopiesBelongToTheCaller) {
   EXPECT_EQ(storedDictionary()->count(), 2u);
 }
 
+TEST_F(PrefsStore, EveryReadSeesTheFileAsItIsAndAnUnchangedValueLeavesItAlone) {
+  auto key = String::make("support_quarrin");
+  setPrintingPref(*key, *String::make("YES"), 5);
+  EXPECT_EQ(copyStringPrintingPref(*key, 5)->utf8(), "YES");
+
+  // Rewritten in place by someone else, same size, its times put back: seen.
+  struct stat before;
+  ASSERT_EQ(stat(store_.c_str(), &before), 0);
+  std::string bytes = *readFile(store_);
+  bytes.replace(bytes.find("YES"), 3, "NOP");
+  ASSERT_TRUE(writeFile(store_, bytes));
+  struct timespec times[2] = {before.st_atim, before.st_mtim};
+  ASSERT_EQ(utimensat(AT_FDCWD, store_.c_str(), times, 0), 0);
+  EXPECT_EQ(copyStringPrintingPref(*key, 5)->utf8(), "NOP");
+
+  // Storing the value the store already holds writes nothing.
+  struct stat rewritten, after;
+  ASSERT_EQ(stat(store_.c_str(), &rewritten), 0);
+  setPrintingPref(*key, *String::make("NOP"), 5);
+  ASSERT_EQ(stat(store_.c_str(), &after), 0);
+  EXPECT_EQ(after.st_ino, rewritten.st_ino) << "not replaced";
+  EXPECT_EQ(after.st_mtim.tv_nsec, rewritten.st_mtim.tv_nsec);
+  EXPECT_EQ(after.st_mtim.tv_sec, rewritten.st_mtim.tv_sec);
+
+  // Any other value replaces it.
+  setPrintingPref(*key, *String::make("YES"), 5);
+  ASSERT_EQ(stat(store_.c_str(), &after), 0);
+  EXPECT_NE(after.st_ino, rewritten.st_ino);
+  EXPECT_EQ(copyStringPrintingPref(*key, 5)->utf8(), "YES");
+  EXPECT_TRUE(logged_.empty());
+}
+
 TEST_F(PrefsStore, CorruptStoreReadsEmptyLogsOnceAndIsKeptBeforeReplacement) {
   const std::string garbage = "<?xml version=\"1.0\"?><plist><dict><key>half";
   std::filesystem::create_directories(dir_ / "var/lib/quarrin");
