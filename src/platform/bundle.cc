@@ -8,6 +8,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <list>
 #include <mutex>
 #include <unordered_map>
@@ -19,7 +20,8 @@
 namespace qr {
 namespace {
 
-// Enough for every installed plug-in; beyond it the least recently opened go.
+// Bundles kept by the cache itself; beyond them, the least recently opened
+// are kept only while some bundle object holds them.
 constexpr size_t kMaxCachedBundles = 1024;
 constexpr size_t kMaxStringsTables = 8;
 // Info dictionaries and strings tables are small; a huge one is refused unread.
@@ -106,7 +108,11 @@ struct Bundle::State {
 
 namespace {
 
-// The process-wide snapshots, most recently opened first.
+// The process-wide snapshots. The most recently opened ones are kept by the
+// cache itself; any other is found for as long as some bundle object still
+// holds it. So every bundle in use (a loaded module keeps its own) is found
+// again after one stat(), however many there are, while the memory the
+// cache keeps of its own stays bounded.
 class BundleCache {
  public:
   using StatePtr = std::shared_ptr<const Bundle::State>;
@@ -114,43 +120,66 @@ class BundleCache {
   StatePtr find(const std::string& path, const Layout& layout) {
     std::lock_guard<std::mutex> lock(mutex_);
     auto it = entries_.find(path);
-    if (it == entries_.end() || !it->second.state->isCurrent(layout)) return nullptr;
-    order_.splice(order_.begin(), order_, it->second.position);
-    return it->second.state;
+    if (it == entries_.end()) return nullptr;
+    StatePtr state = it->second.kept ? it->second.kept : it->second.held.lock();
+    if (!state || !state->isCurrent(layout)) return nullptr;
+    keep(it, std::move(state));
+    return it->second.kept;
   }
 
   void store(const std::string& path, StatePtr state) {
     std::lock_guard<std::mutex> lock(mutex_);
-    auto it = entries_.find(path);
-    if (it != entries_.end()) {
-      it->second.state = std::move(state);
-      order_.splice(order_.begin(), order_, it->second.position);
-      return;
-    }
-    order_.push_front(path);
-    entries_.emplace(path, Entry{std::move(state), order_.begin()});
-    if (entries_.size() > kMaxCachedBundles) {
-      entries_.erase(order_.back());
-      order_.pop_back();
-    }
+    auto it = entries_.try_emplace(path).first;
+    keep(it, std::move(state));
+    if (entries_.size() >= sweepAt_) sweep();
   }
 
   void forget(const std::string& path) {
     std::lock_guard<std::mutex> lock(mutex_);
     auto it = entries_.find(path);
     if (it == entries_.end()) return;
-    order_.erase(it->second.position);
+    if (it->second.kept) recent_.erase(it->second.position);
     entries_.erase(it);
   }
 
  private:
   struct Entry {
-    StatePtr state;
-    std::list<std::string>::iterator position;
+    std::weak_ptr<const Bundle::State> held;    // alive while any bundle object holds it
+    StatePtr kept;                              // set while among the recent ones
+    std::list<std::string>::iterator position;  // in recent_, while kept
   };
+  using Iterator = std::unordered_map<std::string, Entry>::iterator;
+
+  // Makes the entry the most recent, letting the least recent beyond the
+  // limit go back to being merely held.
+  void keep(Iterator it, StatePtr state) {
+    Entry& entry = it->second;
+    if (entry.kept) {
+      recent_.splice(recent_.begin(), recent_, entry.position);
+    } else {
+      recent_.push_front(it->first);
+      entry.position = recent_.begin();
+    }
+    entry.held = state;
+    entry.kept = std::move(state);
+    if (recent_.size() > kMaxCachedBundles) {
+      entries_.find(recent_.back())->second.kept.reset();
+      recent_.pop_back();
+    }
+  }
+
+  // Drops the entries nobody holds any more; run when the table has doubled,
+  // so its cost is spread over the stores that grew it.
+  void sweep() {
+    for (auto it = entries_.begin(); it != entries_.end();)
+      it = !it->second.kept && it->second.held.expired() ? entries_.erase(it) : std::next(it);
+    sweepAt_ = std::max(2 * entries_.size(), 2 * kMaxCachedBundles);
+  }
+
   std::mutex mutex_;
-  std::list<std::string> order_;
+  std::list<std::string> recent_;  // most recent first
   std::unordered_map<std::string, Entry> entries_;
+  size_t sweepAt_ = 2 * kMaxCachedBundles;
 };
 
 BundleCache& bundleCache() {

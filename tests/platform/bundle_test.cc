@@ -278,3 +278,25 @@ TEST(BundleCache, ConcurrentOpensWhileTheInfoChanges) {
   EXPECT_EQ(bad, 0);
   EXPECT_EQ(Bundle::open(dir / "P.plugin")->shortVersionString()->utf8(), "200");
 }
+
+TEST(BundleCache, ABundleStillHeldIsFoundAfterManyOthersWereOpened) {
+  // A run keeps every module's bundle open and asks each for its version
+  // again after opening thousands of others: those lookups must not parse.
+  TempDir dir;
+  std::string info = dir.write("Held.plugin/Contents/Info.plist", infoPlist("com.example.h", "1"));
+  ageFile(info);
+  auto held = Bundle::open(dir / "Held.plugin");
+  ASSERT_TRUE(held && held->infoDictionary());
+  for (int i = 0; i < 1500; ++i) {
+    std::string name = "M" + std::to_string(i) + ".plugin";
+    ageFile(dir.write(name + "/Contents/Info.plist", infoPlist("com.example.m", "1")));
+    ASSERT_TRUE(Bundle::open(dir / name));
+  }
+  auto again = Bundle::open(dir / "Held.plugin");
+  EXPECT_EQ(again->infoDictionary(), held->infoDictionary()) << "parsed again";
+
+  // Still checked at every open: a change is seen all the same.
+  ASSERT_TRUE(qr::writeFile(info, infoPlist("com.example.h", "2")));
+  EXPECT_EQ(Bundle::open(dir / "Held.plugin")->shortVersionString()->utf8(), "2");
+  EXPECT_EQ(held->shortVersionString()->utf8(), "1");
+}
