@@ -42,7 +42,7 @@ static QrDictionaryRef browser_info(void) {
 
 /* "file://<bundle path>/", with the bytes a URL path cannot hold escaped. */
 static QrStringRef bundle_url(void) {
-  char* path = sample_bundle_path();
+  const char* path = sample_bundle_path();
   if (!path) return NULL;
   size_t size = sizeof "file://" + 3 * strlen(path) + 1;
   char* url = malloc(size);
@@ -60,7 +60,6 @@ static QrStringRef bundle_url(void) {
     result = string(url);
   }
   free(url);
-  free(path);
   return result;
 }
 

@@ -14,16 +14,22 @@
 #define SAMPLE_EXPORT __attribute__((visibility("default")))
 
 /* The bundle directory of this shared object (<bundle>/Contents/Linux/<file>),
- * malloc'ed; NULL when it cannot be told. */
-static inline char* sample_bundle_path(void) {
+ * or NULL when it cannot be told. Found once and kept: finding it walks the
+ * list of every loaded shared object. */
+static inline const char* sample_bundle_path(void) {
+  static char* path;
+  static bool found;
+  if (found) return path;
+  found = true;
   Dl_info info;
   if (!dladdr((void*)&sample_bundle_path, &info) || !info.dli_fname) return NULL;
-  char* path = strdup(info.dli_fname);
+  path = strdup(info.dli_fname);
   for (int i = 0; path && i < 3; ++i) {
     char* slash = strrchr(path, '/');
     if (!slash) {
       free(path);
-      return NULL;
+      path = NULL;
+      break;
     }
     *slash = '\0';
   }
@@ -32,12 +38,11 @@ static inline char* sample_bundle_path(void) {
 
 /* "<bundle>/Contents/Resources/<name>", malloc'ed, or NULL. */
 static inline char* sample_resource_path(const char* name) {
-  char* bundle = sample_bundle_path();
+  const char* bundle = sample_bundle_path();
   if (!bundle) return NULL;
   size_t size = strlen(bundle) + strlen(name) + sizeof "/Contents/Resources/";
   char* path = malloc(size);
   if (path) snprintf(path, size, "%s/Contents/Resources/%s", bundle, name);
-  free(bundle);
   return path;
 }
 
@@ -46,7 +51,7 @@ static inline char* sample_resource_path(const char* name) {
  * had to load. One write with O_APPEND, so concurrent loads never mix lines. */
 static inline void sample_note_load(void) {
   const char* trace = getenv("QUARRIN_SAMPLE_TRACE");
-  char* bundle = trace && *trace ? sample_bundle_path() : NULL;
+  const char* bundle = trace && *trace ? sample_bundle_path() : NULL;
   if (!bundle) return;
   const char* name = strrchr(bundle, '/');
   name = name ? name + 1 : bundle;
@@ -60,7 +65,6 @@ static inline void sample_note_load(void) {
     }
     close(fd);
   }
-  free(bundle);
 }
 
 /* ---- Instances ---------------------------------------------------------
