@@ -82,7 +82,7 @@ run "file written" "file not written" "$cache_file"
 cp "$store" "$work/store-before-warm-run.plist"
 run "nothing stored" "cache stored"
 if cmp -s "$store" "$work/store-before-warm-run.plist"; then
-  echo "  (the warm run stored the same cache again)"
+  echo "  (after the warm run the store holds the same cache as before)"
 else
   echo "  (the warm run changed the stored cache)"
 fi
