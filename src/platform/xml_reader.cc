@@ -15,8 +15,8 @@
 #include "platform/dictionary.h"
 #include "platform/property_list.h"
 #include "platform/string.h"
-#include "platform/xml_key_table.h"
 #include "platform/xml_leaf_text.h"
+#include "platform/xml_string_table.h"
 
 namespace qr {
 namespace {
@@ -118,7 +118,10 @@ class Reader {
   std::vector<Ref<Object>> values_;
   std::string text_;
   Ref<Object> root_;
-  xmlplist::KeyTable keys_;
+  // Every key, and short immutable string values, are shared within the parse.
+  static constexpr size_t kShortString = 32;
+  static constexpr size_t kMaxShared = size_t(1) << 18;
+  xmlplist::StringTable strings_{kMaxShared};
 };
 
 void XMLCALL Reader::onStart(void* self, const XML_Char* name, const XML_Char**) {
@@ -244,13 +247,16 @@ void Reader::end() {
 Ref<Object> Reader::leafValue() {
   switch (leaf_) {
     case Tag::Key:
-      return keys_.intern(text_);
+      if (auto shared = strings_.intern(text_)) return shared;
+      return String::fromUTF8(text_);
     case Tag::String:
       if (mutableLeaves_) {
         auto s = qr::make<MutableString>();
         s->appendUTF8(text_);
         return s;
       }
+      if (text_.size() <= kShortString)
+        if (auto shared = strings_.intern(text_)) return shared;
       return String::fromUTF8(text_);
     case Tag::Integer:
       return xmlplist::parseInteger(text_);

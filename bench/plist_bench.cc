@@ -1,0 +1,295 @@
+// Property-list throughput and memory on a cache-like dictionary: 10,000
+// module entries keyed by module URL, each with a bundle version and eight
+// connection types of two five-string browser-info dictionaries (about 94 MB
+// as XML, 46 MB as binary). Each operation runs in a forked child, which
+// reports its time and its peak resident memory above what it started with
+// (the input already loaded), so the figures of one operation never mix with
+// another's. With libplist available, the same operations run through it on
+// the same bytes for comparison.
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <chrono>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <fstream>
+#include <functional>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "platform/array.h"
+#include "platform/dictionary.h"
+#include "platform/file_io.h"
+#include "platform/property_list.h"
+#include "platform/string.h"
+
+#ifdef QUARRIN_HAVE_LIBPLIST
+#include <plist/plist.h>
+#endif
+
+using namespace qr;
+
+namespace {
+
+constexpr int kModules = 10000;
+constexpr int kRuns = 3;
+const char* const kConnectionTypes[] = {"USB", "DNSSD", "Quellnet",  "LPD",
+                                        "IPP", "SMB",   "Bluetooth", "FireWire"};
+
+std::string printf4(const char* format, int a) {
+  char buf[64];
+  std::snprintf(buf, sizeof buf, format, a);
+  return buf;
+}
+
+// Two of the five strings repeat across entries (as printer kinds and makes
+// do), three are unique, which is what gives the binary form its size.
+Ref<Object> generateCache() {
+  auto cache = make<MutableDictionary>();
+  cache->reserve(kModules);
+  for (int m = 1; m <= kModules; ++m) {
+    std::string vendor = printf4("Vendor%04d", (m - 1) / 100 + 1);
+    std::string module = printf4("%04d", m);
+    auto entry = make<MutableDictionary>();
+    entry->set("Bundle Version",
+               String::make(std::to_string(m % 7) + "." + std::to_string(m % 13) + "." + module));
+    for (const char* type : kConnectionTypes) {
+      auto infos = make<MutableArray>();
+      for (int i = 0; i < 2; ++i) {
+        std::string unit = std::to_string(i);
+        auto info = make<MutableDictionary>();
+        info->set("Printer Browser Kind",
+                  String::make(std::string(type) + " printer, class " + unit));
+        info->set("Printer Browser Info",
+                  String::make(vendor + " Module" + module + " " + type + " unit " + unit +
+                               " status: idle, ready to print, queue empty"));
+        info->set("Printer Browser DeviceID",
+                  String::make("MFG:" + vendor + ";MDL:Model " + module + "-" + unit +
+                               ";CMD:PCL,PJL,POSTSCRIPT,PDF,PWG-RASTER;CLS:PRINTER/" + type + ";"));
+        info->set("Printer Make", String::make(vendor + " Imaging Systems"));
+        info->set("Printer Model", String::make(vendor + " Model " + module + " " + type +
+                                                " Series " + unit + " Duplex"));
+        infos->append(info);
+      }
+      entry->set(type, infos);
+    }
+    cache->set(String::make("file:///usr/lib/quarrin/Printers/" + vendor + "/Module" + module +
+                            ".plugin/"),
+               entry);
+  }
+  return cache;
+}
+
+long statusKiB(const char* field) {
+  std::ifstream in("/proc/self/status");
+  std::string line;
+  size_t n = std::strlen(field);
+  while (std::getline(in, line))
+    if (line.compare(0, n, field) == 0) return std::atol(line.c_str() + n + 1);
+  return -1;
+}
+
+struct Figure {
+  bool ok = false;
+  double seconds = 0;
+  double peakMiB = 0;
+  size_t bytes = 0;  // processed: input for reads, output for writes
+};
+
+// Stopped by an operation that checks its result after the timed part.
+struct Stopwatch {
+  std::chrono::steady_clock::time_point end;
+  bool stopped = false;
+  void stop() {
+    end = std::chrono::steady_clock::now();
+    stopped = true;
+  }
+};
+
+// The operation returns the number of bytes it processed, or none on failure.
+using Operation = std::function<std::optional<size_t>(Stopwatch&)>;
+
+Figure runOnce(const Operation& op) {
+  int fds[2];
+  if (pipe(fds) != 0) return {};
+  pid_t pid = fork();
+  if (pid == 0) {
+    close(fds[0]);
+    // A fresh process's peak starts at its resident size at the fork.
+    long base = statusKiB("VmRSS:");
+    Stopwatch watch;
+    auto t0 = std::chrono::steady_clock::now();
+    std::optional<size_t> bytes = op(watch);
+    auto t1 = watch.stopped ? watch.end : std::chrono::steady_clock::now();
+    Figure f;
+    f.ok = bytes.has_value();
+    f.bytes = bytes.value_or(0);
+    f.seconds = std::chrono::duration<double>(t1 - t0).count();
+    f.peakMiB = double(statusKiB("VmHWM:") - base) / 1024.0;
+    ssize_t written = write(fds[1], &f, sizeof f);
+    _exit(written == sizeof f ? 0 : 1);  // skip freeing what the operation built
+  }
+  close(fds[1]);
+  Figure f;
+  if (read(fds[0], &f, sizeof f) != sizeof f) f.ok = false;
+  close(fds[0]);
+  waitpid(pid, nullptr, 0);
+  return f;
+}
+
+// Best time and highest peak of a few runs.
+Figure measure(const Operation& op) {
+  Figure best;
+  for (int i = 0; i < kRuns; ++i) {
+    Figure f = runOnce(op);
+    if (!f.ok) return f;
+    if (!best.ok || f.seconds < best.seconds) {
+      double peak = std::max(best.peakMiB, f.peakMiB);
+      best = f;
+      best.peakMiB = peak;
+    } else {
+      best.peakMiB = std::max(best.peakMiB, f.peakMiB);
+    }
+  }
+  return best;
+}
+
+double mbps(const Figure& f) { return f.ok ? double(f.bytes) / 1e6 / f.seconds : 0; }
+
+std::string cell(const Figure* f) {
+  char buf[64];
+  if (!f || !f->ok)
+    std::snprintf(buf, sizeof buf, "%10s %10s", "n/a", "n/a");
+  else
+    std::snprintf(buf, sizeof buf, "%10.1f %10.1f", mbps(*f), f->peakMiB);
+  return buf;
+}
+
+void row(const char* name, const Figure* ours, const Figure* theirs, const char* goal) {
+  std::printf("%-22s %s   %s", name, cell(ours).c_str(), cell(theirs).c_str());
+  if (ours && theirs && ours->ok && theirs->ok)
+    std::printf("   %5.2fx  %5.2fx  %s", mbps(*ours) / mbps(*theirs),
+                ours->peakMiB / theirs->peakMiB, goal);
+  std::printf("\n");
+}
+
+// The binary form of the XML file, made by Python's plistlib.
+std::optional<std::string> binaryViaPython(const std::string& xmlPath) {
+  std::string binPath = xmlPath + ".bin";
+  pid_t pid = fork();
+  if (pid == 0) {
+    execlp("python3", "python3", "-c",
+           "import plistlib, sys\n"
+           "value = plistlib.load(open(sys.argv[1], 'rb'))\n"
+           "open(sys.argv[2], 'wb').write(plistlib.dumps(value, fmt=plistlib.FMT_BINARY))\n",
+           xmlPath.c_str(), binPath.c_str(), static_cast<char*>(nullptr));
+    _exit(127);
+  }
+  int status = 0;
+  waitpid(pid, &status, 0);
+  auto bytes = readFile(binPath);
+  unlink(binPath.c_str());
+  if (!WIFEXITED(status) || WEXITSTATUS(status) != 0) return std::nullopt;
+  return bytes;
+}
+
+}  // namespace
+
+int main() {
+  Ref<Object> cache = generateCache();
+  std::string xml = *writeXMLPropertyList(*cache);
+
+  char dir[] = "/tmp/plist-bench-XXXXXX";
+  if (!mkdtemp(dir)) return 1;
+  std::string xmlPath = std::string(dir) + "/cache.xml";
+  writeFile(xmlPath, xml);
+  std::optional<std::string> binary = binaryViaPython(xmlPath);
+  unlink(xmlPath.c_str());
+  rmdir(dir);
+
+  std::printf("data: %d module entries, XML %.1f MB", kModules, double(xml.size()) / 1e6);
+  if (binary)
+    std::printf(", binary %.1f MB\n", double(binary->size()) / 1e6);
+  else
+    std::printf("; no binary form: python3 with plistlib is not available\n");
+  std::printf("best of %d runs, each in a forked child; peak = resident memory above the input\n\n",
+              kRuns);
+
+  auto readXML = [&](Mutability m) -> Operation {
+    return [&, m](Stopwatch& watch) -> std::optional<size_t> {
+      Ref<Object> v = readXMLPropertyList(xml, m);
+      watch.stop();
+      if (!v || !v->isEqual(*cache)) return std::nullopt;
+      return xml.size();
+    };
+  };
+  Figure ourXMLRead = measure(readXML(Mutability::Immutable));
+  Figure ourXMLReadMutable = measure(readXML(Mutability::MutableContainersAndLeaves));
+  Figure ourBinaryRead;
+  if (binary)
+    ourBinaryRead = measure([&](Stopwatch& watch) -> std::optional<size_t> {
+      Ref<Object> v = readBinaryPropertyList(*binary, Mutability::Immutable);
+      watch.stop();
+      if (!v || !v->isEqual(*cache)) return std::nullopt;
+      return binary->size();
+    });
+  Figure ourXMLWrite = measure([&](Stopwatch&) -> std::optional<size_t> {
+    auto out = writeXMLPropertyList(*cache);
+    if (!out) return std::nullopt;
+    return out->size();
+  });
+
+  Figure *theirXMLRead = nullptr, *theirBinaryRead = nullptr, *theirXMLWrite = nullptr;
+#ifdef QUARRIN_HAVE_LIBPLIST
+  Figure lpXMLRead, lpBinaryRead, lpXMLWrite;
+  lpXMLRead = measure([&](Stopwatch&) -> std::optional<size_t> {
+    plist_t p = nullptr;
+    plist_from_xml(xml.data(), uint32_t(xml.size()), &p);
+    if (!p) return std::nullopt;
+    return xml.size();
+  });
+  theirXMLRead = &lpXMLRead;
+  if (binary) {
+    lpBinaryRead = measure([&](Stopwatch&) -> std::optional<size_t> {
+      plist_t p = nullptr;
+      plist_from_bin(binary->data(), uint32_t(binary->size()), &p);
+      if (!p) return std::nullopt;
+      return binary->size();
+    });
+    theirBinaryRead = &lpBinaryRead;
+  }
+  {
+    // libplist writes from its own tree, loaded here before the children fork.
+    plist_t tree = nullptr;
+    plist_from_xml(xml.data(), uint32_t(xml.size()), &tree);
+    lpXMLWrite = measure([&](Stopwatch&) -> std::optional<size_t> {
+      char* out = nullptr;
+      uint32_t length = 0;
+      plist_to_xml(tree, &out, &length);
+      if (!out) return std::nullopt;
+      return length;
+    });
+    theirXMLWrite = &lpXMLWrite;
+    plist_free(tree);
+  }
+#else
+  std::printf("libplist: not built in (pkg-config libplist-2.0 found nothing)\n\n");
+#endif
+
+  std::printf("%-22s %10s %10s   %10s %10s   %6s  %6s\n", "", "quarrin", "", "libplist", "",
+              "speed", "memory");
+  std::printf("%-22s %10s %10s   %10s %10s   %6s  %6s\n", "operation", "MB/s", "peak MiB", "MB/s",
+              "peak MiB", "ratio", "ratio");
+  row("XML read", &ourXMLRead, theirXMLRead, "(goal >= 3x, <= 135 MiB)");
+  row("XML read, mutable", &ourXMLReadMutable, theirXMLRead, "");
+  if (binary) {
+    row("binary read", &ourBinaryRead, theirBinaryRead, "(goal >= 3x, <= 135 MiB)");
+    if (!ourBinaryRead.ok) std::printf("  (the binary reader gave no value: n/a)\n");
+  } else {
+    std::printf("%-22s skipped: no binary form without python3\n", "binary read");
+  }
+  row("XML write", &ourXMLWrite, theirXMLWrite, "(goal >= 2x)");
+  return 0;
+}
