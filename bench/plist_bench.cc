@@ -308,7 +308,7 @@ int main() {
     row("binary read", &ourBinaryRead, theirBinaryRead, "(goal >= 3x, <= 135 MiB)");
     if (!ourBinaryRead.ok) std::printf("  (the binary reader gave no value: n/a)\n");
   } else {
-    std::printf("%-22s skipped: no binary form without python3\n", "binary read");
+    std::printf("%-19s skipped: no binary form without python3\n", "binary read");
   }
   row("XML write", &ourXMLWrite, theirXMLWrite, "(goal >= 2x)");
   return 0;
