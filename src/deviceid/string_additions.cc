@@ -7,6 +7,7 @@
 #include "deviceid/device_id_rules.h"
 #include "deviceid/key_search.h"
 #include "deviceid/percent_escape.h"
+#include "deviceid/string_units.h"
 
 namespace PMStringAdditions {
 namespace {
@@ -72,31 +73,6 @@ Found<C> modelOf(View<C> text) {
   if (auto value = search(text, orders().model)) return value;
   if (auto value = search(text, orders().modelFromType)) return value;
   return productModel(search(text, orders().product));
-}
-
-// Narrow views hold ASCII, which is its own UTF-8.
-Ref<String> toString(View<char> units) { return String::fromUTF8(units); }
-Ref<String> toString(View<char16_t> units) { return String::fromUTF16(units); }
-template <class C>
-Ref<String> toString(const Found<C>& units) {
-  return units ? toString(*units) : nullptr;
-}
-
-Ref<MutableString> toMutableString(View<char> units) {
-  auto out = qr::make<MutableString>();
-  out->appendUTF8(units);
-  return out;
-}
-Ref<MutableString> toMutableString(View<char16_t> units) {
-  auto out = qr::make<MutableString>();
-  out->append(units);
-  return out;
-}
-
-// Runs f over the string's code units in whichever width they are stored.
-template <class F>
-auto withUnits(const String& text, F&& f) {
-  return text.isNarrow() ? f(text.narrow()) : f(text.wide());
 }
 
 template <class C>
