@@ -69,6 +69,16 @@ template <class C>
 inline size_t findFolded(View<C> text, const FoldedKey& key) noexcept {
   if (key.units == 0 || key.units > text.size()) return View<C>::npos;
   size_t last = text.size() - key.units;
+  if constexpr (sizeof(C) == 1) {
+    // ASCII text: a match can start only at the key's first letter, in either case.
+    const FoldedKey::Point& first = key.points.front();
+    if (first.width != 1 || first.folded >= 128) return View<C>::npos;
+    auto lower = static_cast<char>(first.folded);
+    auto upper = lower >= 'a' && lower <= 'z' ? static_cast<char>(lower - 32) : lower;
+    for (size_t pos = 0; pos <= last; ++pos)
+      if ((text[pos] == lower || text[pos] == upper) && matchesAt(text, pos, key)) return pos;
+    return View<C>::npos;
+  }
   for (size_t pos = 0; pos <= last; ++pos) {
     if constexpr (sizeof(C) == 2) {
       if (pos > 0 && text[pos] >= 0xDC00 && text[pos] <= 0xDFFF && text[pos - 1] >= 0xD800 &&

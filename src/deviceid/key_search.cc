@@ -24,19 +24,53 @@ std::optional<size_t> matchInComponent(View<C> component, size_t leadingBlanks,
   return std::nullopt;
 }
 
+// For narrow text: the folded first characters of the keys that the shortcut
+// tests, so that a component whose first non-blank character starts none of
+// them is passed over at once. A key that goes the literal way disables it.
+class FirstCharacterFilter {
+ public:
+  FirstCharacterFilter(std::span<const FoldedKey* const> keys, KeySearchMode mode) {
+    for (const FoldedKey* key : keys) {
+      if (key->units == 0) continue;
+      if (mode == KeySearchMode::Literal || key->blankAtEdge) {
+        active_ = false;
+        return;
+      }
+      const FoldedKey::Point& first = key->points.front();
+      if (first.width == 1 && first.folded < 128)
+        bits_[first.folded >> 6] |= uint64_t{1} << (first.folded & 63);
+    }
+  }
+  // Whether some key may match a component with these units after its blanks.
+  bool admits(View<char> rest) const noexcept {
+    if (!active_) return true;
+    if (rest.empty()) return false;
+    char32_t folded = asciiLower(static_cast<unsigned char>(rest.front()));
+    return folded < 128 && ((bits_[folded >> 6] >> (folded & 63)) & 1);
+  }
+
+ private:
+  uint64_t bits_[2] = {0, 0};
+  bool active_ = true;
+};
+
 }  // namespace
 
 template <class C>
 std::optional<View<C>> searchKeys(View<C> text, std::span<const FoldedKey* const> keys,
                                   KeySearchMode mode) {
   if (text.empty() || keys.empty()) return std::nullopt;
+  FirstCharacterFilter filter(keys, mode);
   size_t start = 0;
   for (;;) {
     size_t stop = text.find(static_cast<C>(';'), start);
     View<C> component = text.substr(start, stop == View<C>::npos ? View<C>::npos : stop - start);
     size_t blanks = 0;
     while (blanks < component.size() && isBlank(component[blanks])) ++blanks;
+    bool worthTrying = true;
+    if constexpr (sizeof(C) == 1) worthTrying = filter.admits(component.substr(blanks));
     for (const FoldedKey* key : keys) {
+      if (!worthTrying) break;
       if (auto valueStart = matchInComponent(component, blanks, *key, mode))
         return component.substr(*valueStart);
     }
