@@ -129,12 +129,12 @@ std::optional<Buffer<C>> softwareUpdateIdentifier(std::optional<View<C>> make,
 }
 
 template <class C>
-bool commandSetSupportsPCL(std::optional<View<C>> commandSet) noexcept {
+bool commandSetSupportsPCL(std::optional<View<C>> commandSet) {
   return commandSet && findFolded(*commandSet, capabilityKeys().pcl) != View<C>::npos;
 }
 
 template <class C>
-bool commandSetSupportsPostscript(std::optional<View<C>> commandSet) noexcept {
+bool commandSetSupportsPostscript(std::optional<View<C>> commandSet) {
   if (!commandSet) return true;
   const CapabilityKeys& keys = capabilityKeys();
   if (findFolded(*commandSet, keys.postscript) != View<C>::npos) return true;
@@ -159,8 +159,8 @@ bool commandSetSupportsPostscript(std::optional<View<C>> commandSet) noexcept {
   template Buffer<C> joinedDeviceName(View<C>, View<C>);                              \
   template std::optional<Buffer<C>> softwareUpdateIdentifier(std::optional<View<C>>,  \
                                                              std::optional<View<C>>); \
-  template bool commandSetSupportsPCL(std::optional<View<C>>) noexcept;               \
-  template bool commandSetSupportsPostscript(std::optional<View<C>>) noexcept;
+  template bool commandSetSupportsPCL(std::optional<View<C>>);                        \
+  template bool commandSetSupportsPostscript(std::optional<View<C>>);
 
 QR_DEVICEID_INSTANTIATE(char)
 QR_DEVICEID_INSTANTIATE(char16_t)

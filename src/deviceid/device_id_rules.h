@@ -39,8 +39,8 @@ std::optional<Buffer<C>> softwareUpdateIdentifier(std::optional<View<C>> make,
 
 // No command set means no PCL but PostScript.
 template <class C>
-bool commandSetSupportsPCL(std::optional<View<C>> commandSet) noexcept;
+bool commandSetSupportsPCL(std::optional<View<C>> commandSet);
 template <class C>
-bool commandSetSupportsPostscript(std::optional<View<C>> commandSet) noexcept;
+bool commandSetSupportsPostscript(std::optional<View<C>> commandSet);
 
 }  // namespace qr::deviceid

@@ -69,10 +69,10 @@ std::optional<View<C>> searchKeys(View<C> text, std::span<const FoldedKey* const
     while (blanks < component.size() && isBlank(component[blanks])) ++blanks;
     bool worthTrying = true;
     if constexpr (sizeof(C) == 1) worthTrying = filter.admits(component.substr(blanks));
-    for (const FoldedKey* key : keys) {
-      if (!worthTrying) break;
-      if (auto valueStart = matchInComponent(component, blanks, *key, mode))
-        return component.substr(*valueStart);
+    if (worthTrying) {
+      for (const FoldedKey* key : keys)
+        if (auto valueStart = matchInComponent(component, blanks, *key, mode))
+          return component.substr(*valueStart);
     }
     if (stop == View<C>::npos) return std::nullopt;
     start = stop + 1;
