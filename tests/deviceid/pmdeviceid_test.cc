@@ -211,3 +211,49 @@ TEST(PMDeviceIDProgram, RunsAsBuiltWithItsExitStatuses) {
   EXPECT_EQ(escape.status, 0);
   EXPECT_EQ(escape.out, "a%20b%2Fc\n");
 }
+
+TEST(PMDeviceIDProgram, DictionariesFromXMLPropertyListFiles) {
+  namespace fs = std::filesystem;
+  fs::path dir = fs::temp_directory_path() / ("pmdeviceid-dict-" + std::to_string(getpid()));
+  fs::create_directories(dir);
+  const char* header =
+      "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n"
+      "<!DOCTYPE plist PUBLIC \"-//Apple//DTD PLIST 1.0//EN\" "
+      "\"http://www.apple.com/DTDs/PropertyList-1.0.dtd\">\n<plist version=\"1.0\">\n";
+  std::ofstream(dir / "device.plist") << header
+                                      << "<dict>\n"
+                                         "\t<key>MFG</key><string>Hewlett-Packard</string>\n"
+                                         "\t<key>MDL</key><string>HP LaserJet 4000</string>\n"
+                                         "\t<key>pdl</key><string>application/postscript</string>\n"
+                                         "\t<key>SN</key><integer>1234</integer>\n"
+                                         "\t<key>CID</key><data>AP8=</data>\n"
+                                         "</dict>\n</plist>\n";
+  std::ofstream(dir / "list.plist") << header << "<array><string>MFG</string></array></plist>\n";
+  std::ofstream(dir / "broken.plist") << header << "<dict><key>MFG</key></plist>\n";
+  ToolRun r = runProgram({"--dict", dir / "device.plist", dir / "list.plist", dir / "broken.plist",
+                          dir / "missing.plist"});
+  EXPECT_EQ(r.status, 2);
+  EXPECT_EQ(
+      r.out,
+      R"j({"make":"Hewlett-Packard","model":"HP LaserJet 4000","commandSet":"application/postscript",)j"
+      R"j("compatibleIDs":"AP8=","serialNumber":1234,"product":"(HP LaserJet 4000)",)j"
+      R"j("softwareUpdateScaneID":"MANUFACTURER:Hewlett-Packard;MODEL:HP LaserJet 4000",)j"
+      R"j("supportsPCL":false,"supportsPostscript":true,)j"
+      R"j("stringValue":"MFG:Hewlett-Packard;MDL:HP LaserJet 4000;pdl:application/postscript;)j"
+      R"j(SN:1234;CID:<00ff>"})j"
+      "\n");
+  EXPECT_NE(r.err.find((dir / "list.plist").string() + ": the property list is not a dictionary"),
+            std::string::npos);
+  EXPECT_NE(r.err.find((dir / "broken.plist").string() + ": not a property list"),
+            std::string::npos);
+  EXPECT_NE(r.err.find((dir / "missing.plist").string() + ": cannot be read"), std::string::npos);
+  // One property list on standard input.
+  ToolRun piped =
+      runProgram({"--dict"}, std::string(header) +
+                                 "<dict><key>product</key><string>(deskjet 990c)</string>"
+                                 "</dict></plist>\n");
+  EXPECT_EQ(piped.status, 0);
+  EXPECT_TRUE(piped.out.starts_with(R"j({"make":"hp","model":"deskjet 990c",)j")) << piped.out;
+  EXPECT_TRUE(piped.err.empty()) << piped.err;
+  fs::remove_all(dir);
+}
