@@ -39,8 +39,11 @@ class Bundle final : public Object {
   // valueIfAbsent when the table or the key is missing.
   Ref<String> localizedString(const String& key, const Ref<String>& valueIfAbsent) const;
 
- private:
+  // The parsed snapshot shared by every bundle object of one path and Info
+  // file version (defined in bundle.cc, which keeps the process-wide cache).
   struct State;
+
+ private:
   explicit Bundle(std::shared_ptr<const State> state);
   std::shared_ptr<const State> state_;
 };

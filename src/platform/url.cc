@@ -96,7 +96,7 @@ std::string resolve(std::string_view rel, const URL* base) {
   if (rel.empty()) return std::string(baseAbs);
   if (rel[0] == '/') return std::string(prefix) + removeDotSegments(rel);
   std::string merged(basePath.substr(0, basePath.rfind('/') + 1));
-  if (merged.empty()) merged = "/";
+  if (merged.empty()) merged.push_back('/');
   merged += rel;
   return std::string(prefix) + removeDotSegments(merged);
 }

@@ -1,0 +1,194 @@
+#include "cache/module_cache.h"
+
+#include "platform/bundle.h"
+#include "platform/deep_copy.h"
+#include "platform/file_io.h"
+#include "platform/locations.h"
+#include "platform/log.h"
+#include "platform/prefs_store.h"
+#include "platform/property_list.h"
+
+namespace qr {
+namespace {
+
+constexpr std::string_view kCachePrefKey = "pmcache 5";
+constexpr int kCachePrefDomain = 8;
+constexpr std::string_view kBundleVersionKey = "Bundle Version";
+constexpr std::string_view kConnectionTypeKey = "kIOMConnectionType";
+constexpr std::string_view kBrowserPathKey = "kIOMBrowserPath";
+constexpr std::string_view kIconsKey = "Printer Browser Icons";
+
+Ref<Object> loadDefaultCacheResource() {
+  auto framework = Bundle::open(frameworkBundlePath());
+  if (!framework) return nullptr;
+  auto path = framework->resourcePath("com.varnex.pmcache", "xml");
+  if (!path) return nullptr;
+  auto value = readPropertyListFile(*path);
+  if (!value || value->kind() != TypeKind::Dictionary) return nullptr;
+  return value;
+}
+
+String* stringValue(Object* value) {
+  return value && value->kind() == TypeKind::String ? static_cast<String*>(value) : nullptr;
+}
+
+}  // namespace
+
+QuarrinModuleCache& QuarrinModuleCache::defaultCache() {
+  static QuarrinModuleCache* const cache = new QuarrinModuleCache();
+  return *cache;
+}
+
+MutableDictionary& QuarrinModuleCache::cacheDict() {
+  if (cacheDict_) return *cacheDict_;
+  Ref<Object> source = copyDictionaryPrintingPref(*String::make(kCachePrefKey), kCachePrefDomain);
+  if (!source) source = loadDefaultCacheResource();
+  Ref<MutableDictionary> loaded;
+  if (source)
+    loaded = cast<MutableDictionary>(deepCopy(*source, Mutability::MutableContainersAndLeaves));
+  if (!loaded) {
+    log("Could not load internal printer module cache.");
+    loaded = make<MutableDictionary>();
+  }
+  setCacheDict(loaded);
+  return *cacheDict_;
+}
+
+Ref<Dictionary> QuarrinModuleCache::cacheDictionary() { return cacheDict().copy(); }
+
+void QuarrinModuleCache::setCacheDict(const Ref<MutableDictionary>& dict) {
+  if (cacheDict_ == dict) return;
+  if (cacheDict_ && dict && cacheDict_->isEqual(*dict)) return;
+  dirty_ = true;
+  cacheDict_ = dict;
+}
+
+Ref<String> QuarrinModuleCache::cacheKey(const URL* url) {
+  if (!url) return nullptr;
+  return String::make(url->absoluteString());
+}
+
+Ref<String> QuarrinModuleCache::bundleShortVersion(const URL* module) {
+  Ref<String> version;
+  if (module) {
+    if (auto path = module->fileSystemPath())
+      if (auto bundle = Bundle::open(*path)) version = bundle->shortVersionString();
+  }
+  if (!version) log("Module is missing short version: %@", module);
+  return version;
+}
+
+Ref<MutableArray> QuarrinModuleCache::browserInfo(const Array& info) {
+  auto copy = cast<MutableArray>(deepCopy(info, Mutability::MutableContainersAndLeaves));
+  if (!copy) return nullptr;
+  for (const auto& element : *copy)
+    if (auto* entry = cast<MutableDictionary>(element.get())) entry->remove(kIconsKey);
+  return copy;
+}
+
+MutableDictionary* QuarrinModuleCache::currentEntry(const URL* module) {
+  auto key = cacheKey(module);
+  if (!key) return nullptr;
+  MutableDictionary& top = cacheDict();
+  Object* entry = top.get(*key);
+  if (!entry) return nullptr;
+  auto version = bundleShortVersion(module);
+  auto* dict = cast<MutableDictionary>(entry);
+  String* stored = dict ? stringValue(dict->get(kBundleVersionKey)) : nullptr;
+  if (version && stored && stored->isEqual(*version)) return dict;
+  // A stale entry goes whole: every connection type of the module is asked again.
+  top.remove(*key);
+  dirty_ = true;
+  return nullptr;
+}
+
+MutableDictionary& QuarrinModuleCache::entryFor(const URL& module) {
+  auto key = cacheKey(&module);
+  MutableDictionary& top = cacheDict();
+  Object* existing = top.get(*key);
+  if (auto* dict = cast<MutableDictionary>(existing)) return *dict;
+  // A hand-edited entry that is not a mutable dictionary is taken over as one.
+  Ref<MutableDictionary> entry;
+  if (auto* frozen = cast<Dictionary>(existing))
+    entry = cast<MutableDictionary>(deepCopy(*frozen, Mutability::MutableContainersAndLeaves));
+  if (!entry) entry = make<MutableDictionary>();
+  top.set(key, entry);
+  return *entry;
+}
+
+void QuarrinModuleCache::addInfo(const Array* info, const URL* forPrinterModule,
+                                 const String* andConnection) {
+  if (!forPrinterModule) return;
+  Ref<MutableArray> value = info ? browserInfo(*info) : nullptr;
+  if (!value) value = make<MutableArray>();
+  MutableDictionary& entry = entryFor(*forPrinterModule);
+  if (andConnection) {
+    entry.set(Ref<Object>(andConnection->copy()), value);
+    if (auto version = bundleShortVersion(forPrinterModule))
+      entry.set(kBundleVersionKey, version);
+    else
+      entry.remove(kBundleVersionKey);  // never current without a version
+  }
+  dirty_ = true;
+}
+
+Ref<MutableArray> QuarrinModuleCache::getInfoForPrinterModule(const URL* module,
+                                                              const String* andConnection) {
+  MutableDictionary* entry = currentEntry(module);
+  if (!entry || !andConnection) return nullptr;
+  auto* info = cast<Array>(entry->get(*andConnection));
+  if (!info) return nullptr;
+  return browserInfo(*info);
+}
+
+void QuarrinModuleCache::addInfoForIOModule(const URL* module, const String* toConnection,
+                                            const String* andBrowser) {
+  if (!module) return;
+  MutableDictionary& entry = entryFor(*module);
+  if (auto version = bundleShortVersion(module))
+    entry.set(kBundleVersionKey, version);
+  else
+    entry.remove(kBundleVersionKey);
+  if (toConnection) entry.set(kConnectionTypeKey, toConnection->copy());
+  if (andBrowser) entry.set(kBrowserPathKey, andBrowser->copy());
+  dirty_ = true;
+}
+
+bool QuarrinModuleCache::getInfoForIOModule(const URL* module, Ref<String>* connection,
+                                            Ref<String>* browser) {
+  MutableDictionary* entry = currentEntry(module);
+  if (!entry) return false;
+  if (connection) *connection = stringValue(entry->get(kConnectionTypeKey));
+  if (browser) *browser = stringValue(entry->get(kBrowserPathKey));
+  return true;
+}
+
+bool QuarrinModuleCache::writeCache() {
+  if (!dirty_) return false;
+  setPrintingPref(*String::make(kCachePrefKey), cacheDict(), kCachePrefDomain);
+  dirty_ = false;
+  return true;
+}
+
+bool QuarrinModuleCache::writeToFd(int fd) {
+  auto xml = writeXMLPropertyList(cacheDict());
+  if (!xml) return false;
+  return writeAll(fd, *xml);
+}
+
+bool QuarrinModuleCache::readFromFd(int fd) {
+  std::string bytes;
+  readAll(fd, bytes);  // a read error ends the input; what came before still counts
+  if (bytes.empty()) return dirty_;
+  auto value = readPropertyList(bytes, Mutability::MutableContainersAndLeaves);
+  if (!value) return dirty_;
+  auto dict = cast<MutableDictionary>(value);
+  if (!dict) {
+    log("Ignoring a cache on standard input that is not a dictionary.");
+    return dirty_;
+  }
+  setCacheDict(dict);
+  return dirty_;
+}
+
+}  // namespace qr

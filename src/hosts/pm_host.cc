@@ -1,0 +1,46 @@
+#include "hosts/pm_host.h"
+
+#include "platform/deep_copy.h"
+
+namespace qr {
+
+PMModule* PMHost::pmInterfaceForURL(const URL* url) const {
+  if (!url) return nullptr;
+  return cast<PMModule>(loadedPlugins()->get(*url));
+}
+
+LookupInfoList* PMHost::GetLookupInfoList(const String& connectionType) {
+  LookupInfoList* list = nullptr;
+  for (const auto& item : *_lookupLists) {
+    auto* candidate = cast<LookupInfoList>(item.get());
+    if (candidate && candidate->connectionType() &&
+        candidate->connectionType()->isEqual(connectionType)) {
+      list = candidate;
+      break;
+    }
+  }
+  if (!list) {
+    auto created = make<LookupInfoList>(connectionType.copy());
+    list = created.get();
+    _lookupLists->append(created);
+  }
+  if (list->maxIndex() != 0) return list;
+
+  Ref<String> type = connectionType.copy();
+  for (const auto& key : loadedPlugins()->keys()) {
+    auto* url = cast<URL>(key.get());
+    PMModule* module = pmInterfaceForURL(url);
+    if (!module) continue;
+    Ref<MutableArray> answer = module->createBrowserInfoForConnectionType(connectionType);
+    if (!answer) continue;
+    for (const auto& entry : *answer) {
+      auto copy = cast<MutableDictionary>(deepCopy(*entry, Mutability::MutableContainersAndLeaves));
+      if (!copy) continue;  // not a property-list dictionary
+      copy->set("connectionType", type);
+      list->addItem(make<LookupInfoItem>(url, copy.get()));
+    }
+  }
+  return list;
+}
+
+}  // namespace qr

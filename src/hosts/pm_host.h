@@ -1,0 +1,27 @@
+// Host of the printer modules: gathers, per connection type, every printer
+// module's browser info into a lookup list.
+#pragma once
+
+#include "hosts/host.h"
+#include "hosts/lookup_info.h"
+#include "modules/pm_module.h"
+
+namespace qr {
+
+class PMHost final : public QuarrinHost {
+ public:
+  PMHost() : _lookupLists(make<MutableArray>()) {}
+
+  MutableArray* lookupLists() const noexcept { return _lookupLists.get(); }
+  void setLookupLists(Ref<MutableArray> lists) { _lookupLists = std::move(lists); }
+  // The list for the connection type, never null. A list that already holds
+  // items is returned as it is; an empty one asks every module again.
+  LookupInfoList* GetLookupInfoList(const String& connectionType);
+  // The module registered under exactly that URL (a registry key), or null.
+  PMModule* pmInterfaceForURL(const URL* url) const;
+
+ private:
+  Ref<MutableArray> _lookupLists;
+};
+
+}  // namespace qr

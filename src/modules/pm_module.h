@@ -1,0 +1,35 @@
+// Printer module: offers browser info per connection type, the dictionaries
+// by which a printer browser recognises the printers the module drives.
+// "Quellnet" answers are filed under "DNSSD", and a module with no network
+// discovery answer lends its USB answer, marked "USBParasite".
+#pragma once
+
+#include "modules/module.h"
+#include "platform/array.h"
+#include "platform/data.h"
+#include "platform/dictionary.h"
+#include "platform/string.h"
+
+namespace qr {
+
+class PMModule final : public QuarrinModule {
+ public:
+  using QuarrinModule::QuarrinModule;
+
+  UUID* typeID() const override;
+  UUID* interfaceID() const override;
+
+  // The browser info for the connection type, or null; the entries are
+  // mutable and belong to the caller alone.
+  Ref<MutableArray> createBrowserInfoForConnectionType(const String& connectionType);
+  // Icon image data for one browser-info entry, or null.
+  Ref<Data> iconDataForConnectionType(const String& connectionType, const Dictionary& browserInfo);
+
+ private:
+  // The plug-in's answer, asking the other network discovery type when one
+  // gives nothing; null when it gives nothing or raises.
+  Ref<Array> askPlugin(const String& connectionType);
+  Ref<Array> askPluginOnce(const String& connectionType);
+};
+
+}  // namespace qr

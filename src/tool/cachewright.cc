@@ -1,0 +1,86 @@
+#include "tool/cachewright.h"
+
+#include <unistd.h>
+
+#include <cstdio>
+#include <cstdlib>
+
+#include "cache/module_cache.h"
+#include "modules/module_factory.h"
+#include "platform/dictionary.h"
+#include "platform/file_io.h"
+#include "platform/log.h"
+#include "platform/property_list.h"
+#include "platform/string.h"
+#include "tool/discovery.h"
+
+namespace qr {
+
+const char kCachewrightUsage[] =
+    "Usage: cachewright [-s]\n"
+    "    -s               Use stdin/stdout to read/write cache dictionary.\n";
+
+namespace {
+
+constexpr int kMaxDiscoveryDepth = 200;
+
+// Path mode: exactly one word after the program name, and it begins with "/".
+bool isPathMode(int argc, char** argv) { return argc == 2 && argv[1][0] == '/'; }
+
+// Finds the installed modules and asks each what it offers; the answers land
+// in the cache. The hosts, and with them every module, go when this returns.
+void askModules() {
+  auto pmHost = make<PMHost>();
+  auto iomHost = make<IOMHost>();
+  auto pbmHost = make<PBMHost>();
+  QuarrinModuleFactory::resetLoadFailures();
+  discoverModules(kMaxDiscoveryDepth, *pmHost, *iomHost, *pbmHost);
+  for (const auto& item : *iomHost->connectionInfoList()) {
+    auto* record = cast<ConnectionInfo>(item.get());
+    if (record && record->connectionType()) pmHost->GetLookupInfoList(*record->connectionType());
+  }
+}
+
+// Serialises before opening the file, so a value that cannot be written
+// never leaves a truncated file behind.
+bool writeCacheFile(const char* path) {
+  auto xml = writeXMLPropertyList(*QuarrinModuleCache::defaultCache().cacheDictionary());
+  return xml && writeFile(path, *xml);
+}
+
+}  // namespace
+
+int runCachewright(int argc, char** argv) {
+  bool streamMode = false;
+  for (int opt; (opt = getopt(argc, argv, "s?")) != -1;) {
+    if (opt != 's') {
+      fputs(kCachewrightUsage, stderr);
+      exit(1);
+    }
+    streamMode = true;
+  }
+
+  if (streamMode)
+    QuarrinModuleCache::defaultCache().readFromFd(STDIN_FILENO);
+  else if (isPathMode(argc, argv))
+    QuarrinModuleCache::defaultCache().setCacheDict(make<MutableDictionary>());
+
+  askModules();
+
+  int status;
+  if (streamMode) {
+    status = 0;
+    if (!QuarrinModuleCache::defaultCache().writeToFd(STDOUT_FILENO)) {
+      // A truncated cache on standard output must not pass for a good one.
+      log("Could not write the printer module cache to standard output.");
+      status = 1;
+    }
+  } else {
+    status = QuarrinModuleCache::defaultCache().writeCache() ? 1 : 0;
+  }
+
+  if (isPathMode(argc, argv) && String::fromUTF8(argv[1])) status = writeCacheFile(argv[1]) ? 0 : 1;
+  return status;
+}
+
+}  // namespace qr
