@@ -34,7 +34,7 @@ using namespace qr;
 namespace {
 
 constexpr int kModules = 10000;
-constexpr int kRuns = 3;
+constexpr int kRuns = 5;
 const char* const kConnectionTypes[] = {"USB", "DNSSD", "Quellnet",  "LPD",
                                         "IPP", "SMB",   "Bluetooth", "FireWire"};
 

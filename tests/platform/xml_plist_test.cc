@@ -13,10 +13,10 @@
 #include "platform/string.h"
 #include "platform/url.h"
 #include "platform/uuid.h"
-#include "plist_identity.h"
+#include "support/plist_identity.h"
 
 using namespace qr;
-using qr::testing::identical;
+using qrtest::identical;
 
 namespace {
 
