@@ -60,7 +60,7 @@ TEST_F(ConnectionTitles, TheStringsTableNamesTheBrowserWhenTheIdentifierIsAskedF
 
   unsetenv("LANG");
   auto english = record(fixtureBundle("pbm_localized"));
-  EXPECT_TRUE(english->PBMFromVarnex() == false);
+  EXPECT_FALSE(english->PBMFromVarnex()) << "asks the identifier, and so the table";
   EXPECT_EQ(utf8(english->connectionTitle()), "Localized Browser");
 
   // No key for the identifier: the connection type is the next key.
@@ -96,7 +96,7 @@ TEST_F(ConnectionTitles, TheIdentifierStandsInForATitleTheBrowserCannotGive) {
                                      fixtureBundle("c_pbm") + "/Contents/Info.plist"}) {
     for (bool titleFirst : {false, true}) {
       auto r = record(missing);
-      Ref<String> title = titleFirst ? r->connectionTitle() : nullptr;
+      if (titleFirst) r->connectionTitle();
       EXPECT_EQ(utf8(r->connectionBundleID()), "") << missing;
       EXPECT_FALSE(r->PBMFromVarnex());
       EXPECT_EQ(utf8(r->connectionTitle()), "") << missing;
