@@ -4,7 +4,7 @@
 #include <cstdlib>
 #include <string_view>
 
-#include "../tests/platform/plist_identity.h"
+#include "../tests/support/plist_identity.h"
 #include "platform/property_list.h"
 
 using namespace qr;
@@ -18,13 +18,13 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size) {
     // The option changes the kinds of objects, never whether a document reads.
     if (m == Mutability::Immutable)
       first = value;
-    else if (!testing::identical(first.get(), value.get()))
+    else if (!qrtest::identical(first.get(), value.get()))
       std::abort();
     if (!value) continue;
     auto xml = writeXMLPropertyList(*value);
     if (!xml) std::abort();  // whatever reads must be writable
     Ref<Object> back = readXMLPropertyList(*xml, m);
-    if (!back || !testing::identical(value.get(), back.get())) std::abort();
+    if (!back || !qrtest::identical(value.get(), back.get())) std::abort();
     auto again = writeXMLPropertyList(*back);
     if (!again || *again != *xml) std::abort();
   }

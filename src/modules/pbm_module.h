@@ -1,6 +1,6 @@
 // Printer browser module: a user-interface plug-in that finds and lists the
 // printers of one connection type. It can be opened for its title alone, or
-// fully, in which case it is handed the lookup specs of its connection type
+// fully, in which case it is handed the lookup dictionaries of its connection type
 // through the callbacks record; the client's requests are forwarded to the
 // plug-in's entries.
 #pragma once
@@ -63,7 +63,7 @@ class PBMModule final : public QuarrinModule {
   PMHost* pmHost() const noexcept { return _pmHost; }
   const PMPrBrowserCallbacks* browserCallbacks() const noexcept { return _browserCallbacks; }
 
-  // The host's lookup-spec function: refCon is the module given to Initialize.
+  // The host's lookup function: refCon is the module given to Initialize.
   static int32_t defaultGetLookupSpec(void* refCon, uint32_t index, QrDictionaryRef* lookupSpec);
 
  private:

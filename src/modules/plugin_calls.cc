@@ -3,6 +3,7 @@
 #include <quarrin/plugin.h>
 
 #include <cstring>
+#include <utility>
 
 #include "platform/c_bridge.h"
 
@@ -45,9 +46,17 @@ int32_t getConnectionInfo(void* interface, Ref<String>* connectionType, Ref<Stri
 
 Ref<Array> createBrowserInfo(void* interface, const String& connectionType) {
   QrArrayRef info = nullptr;
+  // The array is the caller's even when the plug-in raises after handing it out.
+  struct TakeOver {
+    QrArrayRef& info;
+    Ref<Array> taken;
+    ~TakeOver() {
+      if (info) taken = adoptFromC<Array>(std::exchange(info, nullptr));
+    }
+  } takeOver{info, nullptr};
   tableOf<QrPrinterModuleVTbl>(interface)->CreateBrowserInfo(toC<QrStringRef>(&connectionType),
-                                                              &info);
-  return adoptFromC<Array>(info);
+                                                             &info);
+  return adoptFromC<Array>(std::exchange(info, nullptr));
 }
 
 }  // namespace qr::plugin_calls

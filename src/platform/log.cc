@@ -42,9 +42,9 @@ std::string formatArgs(std::string_view fmt, const std::vector<FormatArg>& args)
     }
     // Flags and width, then a conversion letter.
     size_t j = i + 1;
-    std::string spec = "%";
+    std::string directive = "%";
     while (j < fmt.size() && (fmt[j] == '0' || fmt[j] == '-' || (fmt[j] >= '1' && fmt[j] <= '9')))
-      spec += fmt[j++];
+      directive += fmt[j++];
     if (j == fmt.size()) {
       out.append(fmt.substr(i));
       break;
@@ -84,16 +84,16 @@ std::string formatArgs(std::string_view fmt, const std::vector<FormatArg>& args)
         int64_t v = !a ? 0 : a->type == FormatArg::Type::Signed ? a->i : int64_t(a->u);
         if (conv == 'd' || conv == 'i') {
           // %d prints a 32-bit int, as the messages were written for one.
-          std::snprintf(buf, sizeof buf, (spec + "" PRId32).c_str(), static_cast<int32_t>(v));
+          std::snprintf(buf, sizeof buf, (directive + "" PRId32).c_str(), static_cast<int32_t>(v));
         } else {
-          std::string f = spec + (conv == 'u' ? PRIu32 : conv == 'x' ? PRIx32 : PRIX32);
+          std::string f = directive + (conv == 'u' ? PRIu32 : conv == 'x' ? PRIx32 : PRIX32);
           std::snprintf(buf, sizeof buf, f.c_str(), static_cast<uint32_t>(v));
         }
         out += buf;
         break;
       }
       default:
-        out += spec;
+        out += directive;
         out += conv;
         break;
     }

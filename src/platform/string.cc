@@ -52,9 +52,17 @@ Ref<String> fromKnownUnits(std::u16string_view units) {
 }  // namespace
 
 bool isASCII(std::string_view bytes) noexcept {
-  for (unsigned char c : bytes)
-    if (c >= 0x80) return false;
-  return true;
+  // A word at a time: every parser asks this of every string it reads.
+  const char* p = bytes.data();
+  size_t n = bytes.size();
+  uint64_t seen = 0;
+  for (; n >= 8; p += 8, n -= 8) {
+    uint64_t word;
+    std::memcpy(&word, p, 8);
+    seen |= word;
+  }
+  for (; n > 0; ++p, --n) seen |= static_cast<unsigned char>(*p);
+  return (seen & 0x8080808080808080ull) == 0;
 }
 
 bool decodeUTF8(std::string_view in, std::u16string& out) {

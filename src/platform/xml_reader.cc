@@ -15,8 +15,8 @@
 #include "platform/dictionary.h"
 #include "platform/property_list.h"
 #include "platform/string.h"
-#include "platform/xml_key_table.h"
 #include "platform/xml_leaf_text.h"
+#include "platform/xml_string_table.h"
 
 namespace qr {
 namespace {
@@ -65,8 +65,13 @@ Tag tagOf(const XML_Char* name) noexcept {
 }
 
 bool isXMLSpace(const XML_Char* s, int len) noexcept {
-  for (int i = 0; i < len; ++i)
-    if (s[i] != ' ' && s[i] != '\t' && s[i] != '\n' && s[i] != '\r') return false;
+  // Indentation reaches this handler one run at a time, millions of times
+  // in a large file: one shift and mask per character.
+  constexpr uint64_t kSpaces = 1ull << ' ' | 1ull << '\t' | 1ull << '\n' | 1ull << '\r';
+  for (int i = 0; i < len; ++i) {
+    auto c = static_cast<unsigned char>(s[i]);
+    if (c > ' ' || !(kSpaces >> c & 1)) return false;
+  }
   return true;
 }
 
@@ -118,7 +123,10 @@ class Reader {
   std::vector<Ref<Object>> values_;
   std::string text_;
   Ref<Object> root_;
-  xmlplist::KeyTable keys_;
+  // Every key, and short immutable string values, are shared within the parse.
+  static constexpr size_t kShortString = 32;
+  static constexpr size_t kMaxShared = size_t(1) << 18;
+  xmlplist::StringTable strings_{kMaxShared};
 };
 
 void XMLCALL Reader::onStart(void* self, const XML_Char* name, const XML_Char**) {
@@ -244,13 +252,16 @@ void Reader::end() {
 Ref<Object> Reader::leafValue() {
   switch (leaf_) {
     case Tag::Key:
-      return keys_.intern(text_);
+      if (auto shared = strings_.intern(text_)) return shared;
+      return String::fromUTF8(text_);
     case Tag::String:
       if (mutableLeaves_) {
         auto s = qr::make<MutableString>();
         s->appendUTF8(text_);
         return s;
       }
+      if (text_.size() <= kShortString)
+        if (auto shared = strings_.intern(text_)) return shared;
       return String::fromUTF8(text_);
     case Tag::Integer:
       return xmlplist::parseInteger(text_);

@@ -2,9 +2,17 @@
 // something no reader accepts: values that are not property-list values,
 // non-string keys, text that XML 1.0 cannot carry, nesting beyond the
 // readers' limit, and dates outside the four-digit years.
+//
+// The value is walked twice by the same code: once into a counter, which
+// also finds anything unwritable, and once into a string of exactly the
+// counted size. Large outputs thus cost one allocation and one touch of
+// each page, and never a copy.
+#include <sys/mman.h>
+
 #include <algorithm>
 #include <charconv>
 #include <cmath>
+#include <cstdint>
 #include <cstring>
 #include <vector>
 
@@ -14,97 +22,141 @@
 #include "platform/date.h"
 #include "platform/dictionary.h"
 #include "platform/number.h"
-#include "platform/output_blocks.h"
 #include "platform/property_list.h"
 #include "platform/string.h"
 #include "platform/xml_leaf_text.h"
+#include "platform/xml_text_scan.h"
 
 namespace qr {
 namespace {
 
-// What an ASCII character needs in element text.
-enum : uint8_t { kPlain, kEscape, kForbidden };
+using xmlplist::kAsciiClass;
+using xmlplist::kEscape;
+using xmlplist::kForbidden;
 
-struct AsciiClasses {
-  uint8_t of[128];
-  constexpr AsciiClasses() : of() {
-    for (int c = 0; c < 0x20; ++c) of[c] = kForbidden;
-    of[int('\t')] = of[int('\n')] = kPlain;
-    // A raw carriage return would come back as a line feed.
-    of[int('\r')] = of[int('&')] = of[int('<')] = of[int('>')] = kEscape;
+std::string_view escapeFor(char c) noexcept {
+  switch (c) {
+    case '&':
+      return "&amp;";
+    case '<':
+      return "&lt;";
+    case '>':
+      return "&gt;";
+    default:
+      return "&#13;";  // a raw carriage return would read back as a line feed
   }
-};
-constexpr AsciiClasses kAscii;
-
-// Longest escape ("&amp;", "&#13;") and longest UTF-8 per code unit, which
-// bounds what one code unit can turn into.
-constexpr size_t kMaxBytesPerUnit = 5;
-// Text goes out in pieces so that the room reserved stays bounded.
-constexpr size_t kTextPiece = 64 * 1024;
-
-char* escape(char c, char* p) noexcept {
-  const char* e = c == '&' ? "&amp;" : c == '<' ? "&lt;" : c == '>' ? "&gt;" : "&#13;";
-  size_t n = c == '<' || c == '>' ? 4 : 5;
-  std::memcpy(p, e, n);
-  return p + n;
 }
 
-class Writer {
+// The first pass: counts bytes and writes nothing.
+class Counter {
  public:
-  bool value(const Object& v, size_t depth);
-  std::string finish() { return out_.finish(); }
-  template <size_t N>
-  void put(const char (&literal)[N]) {
-    char* p = out_.reserve(N - 1);
-    std::memcpy(p, literal, N - 1);
-    out_.commit(p + N - 1);
+  static constexpr bool kSortsKeys = false;  // the order does not change the size
+  void put(std::string_view s) noexcept { n_ += s.size(); }
+  void tabs(size_t n) noexcept { n_ += n; }
+  void base64(const uint8_t*, size_t n) noexcept { n_ += xmlplist::base64Length(n); }
+  void utf8(uint32_t codePoint) noexcept {
+    n_ += codePoint < 0x800 ? 2 : codePoint < 0x10000 ? 3 : 4;
   }
+  size_t size() const noexcept { return n_; }
 
  private:
-  // Indentation, then the literal.
-  template <size_t N>
-  void line(size_t indent, const char (&literal)[N]) {
-    char* p = out_.reserve(indent + N - 1);
-    std::memset(p, '\t', indent);
-    std::memcpy(p + indent, literal, N - 1);
-    out_.commit(p + indent + N - 1);
+  size_t n_ = 0;
+};
+
+// The second pass: writes into the room the first pass counted. A value
+// changed by another thread in between could need more; the printer then
+// stops instead of overrunning, and the write fails.
+class Printer {
+ public:
+  static constexpr bool kSortsKeys = true;
+  Printer(char* begin, char* end) noexcept : p_(begin), end_(end) {}
+  void put(std::string_view s) noexcept {
+    if (!room(s.size())) return;
+    std::memcpy(p_, s.data(), s.size());
+    p_ += s.size();
   }
+  void tabs(size_t n) noexcept {
+    if (!room(n)) return;
+    std::memset(p_, '\t', n);
+    p_ += n;
+  }
+  void base64(const uint8_t* bytes, size_t n) noexcept {
+    if (room(xmlplist::base64Length(n))) p_ = xmlplist::encodeBase64(bytes, n, p_);
+  }
+  void utf8(uint32_t c) noexcept {
+    if (c < 0x800) {
+      if (room(2)) {
+        *p_++ = static_cast<char>(0xC0 | (c >> 6));
+        *p_++ = static_cast<char>(0x80 | (c & 0x3F));
+      }
+    } else if (c < 0x10000) {
+      if (room(3)) {
+        *p_++ = static_cast<char>(0xE0 | (c >> 12));
+        *p_++ = static_cast<char>(0x80 | ((c >> 6) & 0x3F));
+        *p_++ = static_cast<char>(0x80 | (c & 0x3F));
+      }
+    } else if (room(4)) {
+      *p_++ = static_cast<char>(0xF0 | (c >> 18));
+      *p_++ = static_cast<char>(0x80 | ((c >> 12) & 0x3F));
+      *p_++ = static_cast<char>(0x80 | ((c >> 6) & 0x3F));
+      *p_++ = static_cast<char>(0x80 | (c & 0x3F));
+    }
+  }
+  bool filledExactly() const noexcept { return !overflow_ && p_ == end_; }
+
+ private:
+  bool room(size_t n) noexcept {
+    if (n <= static_cast<size_t>(end_ - p_)) return true;
+    overflow_ = true;
+    return false;
+  }
+  char* p_;
+  char* end_;
+  bool overflow_ = false;
+};
+
+template <class Out>
+class Walker {
+ public:
+  explicit Walker(Out& out) : out_(out) {}
+  bool value(const Object& v, size_t depth);
+
+ private:
   bool text(const String& s);
   bool narrowText(std::string_view s);
   bool wideText(std::u16string_view s);
-  bool number(const Number& n, size_t indent);
-  bool date(const Date& d, size_t indent);
+  bool number(const Number& n);
+  bool date(const Date& d);
   void data(const Data& d, size_t indent);
   bool array(const Array& a, size_t depth);
   bool dictionary(const Dictionary& d, size_t depth);
 
-  OutputBlocks out_;
+  Out& out_;
   // Entries of the dictionaries being written, innermost last, for sorting.
   std::vector<std::pair<const String*, const Object*>> entries_;
 };
 
-bool Writer::value(const Object& v, size_t depth) {
+template <class Out>
+bool Walker<Out>::value(const Object& v, size_t depth) {
   if (depth > kMaxPropertyListDepth) return false;
   size_t indent = depth - 1;
+  out_.tabs(indent);
   switch (v.kind()) {
     case TypeKind::String:
-      line(indent, "<string>");
+      out_.put("<string>");
       if (!text(static_cast<const String&>(v))) return false;
-      put("</string>\n");
+      out_.put("</string>\n");
       return true;
     case TypeKind::Number:
-      return number(static_cast<const Number&>(v), indent);
+      return number(static_cast<const Number&>(v));
     case TypeKind::Boolean:
-      if (static_cast<const Boolean&>(v).value())
-        line(indent, "<true/>\n");
-      else
-        line(indent, "<false/>\n");
+      out_.put(static_cast<const Boolean&>(v).value() ? "<true/>\n" : "<false/>\n");
       return true;
     case TypeKind::Data:
       data(static_cast<const Data&>(v), indent);
       return true;
     case TypeKind::Date:
-      return date(static_cast<const Date&>(v), indent);
+      return date(static_cast<const Date&>(v));
     case TypeKind::Array:
       return array(static_cast<const Array&>(v), depth);
     case TypeKind::Dictionary:
@@ -114,137 +166,113 @@ bool Writer::value(const Object& v, size_t depth) {
   }
 }
 
-bool Writer::text(const String& s) {
+template <class Out>
+bool Walker<Out>::text(const String& s) {
   return s.isNarrow() ? narrowText(s.narrow()) : wideText(s.wide());
 }
 
-bool Writer::narrowText(std::string_view s) {
-  const auto* bytes = reinterpret_cast<const unsigned char*>(s.data());
-  size_t i = 0;
-  while (i < s.size()) {
-    size_t end = std::min(s.size(), i + kTextPiece);
-    char* p = out_.reserve((end - i) * kMaxBytesPerUnit);
-    while (i < end) {
-      size_t run = i;
-      while (run < end && kAscii.of[bytes[run]] == kPlain) ++run;
-      std::memcpy(p, bytes + i, run - i);
-      p += run - i;
-      i = run;
-      if (i == end) break;
-      if (kAscii.of[bytes[i]] == kForbidden) return false;
-      p = escape(static_cast<char>(bytes[i++]), p);
-    }
-    out_.commit(p);
+template <class Out>
+bool Walker<Out>::narrowText(std::string_view s) {
+  while (!s.empty()) {
+    size_t run = xmlplist::plainRun(s.data(), s.size());
+    out_.put(s.substr(0, run));
+    if (run == s.size()) break;
+    char c = s[run];
+    uint8_t cls = kAsciiClass[static_cast<unsigned char>(c)];
+    if (cls == kForbidden) return false;
+    out_.put(cls == kEscape ? escapeFor(c) : std::string_view(&s[run], 1));
+    s.remove_prefix(run + 1);
   }
   return true;
 }
 
-bool Writer::wideText(std::u16string_view s) {
-  size_t i = 0;
-  while (i < s.size()) {
-    size_t end = std::min(s.size(), i + kTextPiece);
-    char* p = out_.reserve((end - i + 1) * kMaxBytesPerUnit);
-    for (; i < end; ++i) {
-      uint32_t c = s[i];
-      if (c < 0x80) {
-        uint8_t cls = kAscii.of[c];
-        if (cls == kForbidden) return false;
-        if (cls == kEscape)
-          p = escape(static_cast<char>(c), p);
-        else
-          *p++ = static_cast<char>(c);
-      } else if (c < 0x800) {
-        *p++ = static_cast<char>(0xC0 | (c >> 6));
-        *p++ = static_cast<char>(0x80 | (c & 0x3F));
-      } else if (c >= 0xD800 && c <= 0xDFFF) {
-        // Only a high surrogate followed by a low one is a character.
-        if (c >= 0xDC00 || i + 1 >= s.size() || s[i + 1] < 0xDC00 || s[i + 1] > 0xDFFF)
-          return false;
-        uint32_t cp = 0x10000 + ((c - 0xD800) << 10) + (s[++i] - 0xDC00u);
-        *p++ = static_cast<char>(0xF0 | (cp >> 18));
-        *p++ = static_cast<char>(0x80 | ((cp >> 12) & 0x3F));
-        *p++ = static_cast<char>(0x80 | ((cp >> 6) & 0x3F));
-        *p++ = static_cast<char>(0x80 | (cp & 0x3F));
-      } else {
-        if (c == 0xFFFE || c == 0xFFFF) return false;
-        *p++ = static_cast<char>(0xE0 | (c >> 12));
-        *p++ = static_cast<char>(0x80 | ((c >> 6) & 0x3F));
-        *p++ = static_cast<char>(0x80 | (c & 0x3F));
-      }
+template <class Out>
+bool Walker<Out>::wideText(std::u16string_view s) {
+  for (size_t i = 0; i < s.size(); ++i) {
+    uint32_t c = s[i];
+    if (c < 0x80) {
+      char ascii = static_cast<char>(c);
+      uint8_t cls = kAsciiClass[c];
+      if (cls == kForbidden) return false;
+      out_.put(cls == kEscape ? escapeFor(ascii) : std::string_view(&ascii, 1));
+    } else if (c >= 0xD800 && c <= 0xDFFF) {
+      // Only a high surrogate followed by a low one is a character.
+      if (c >= 0xDC00 || i + 1 >= s.size() || s[i + 1] < 0xDC00 || s[i + 1] > 0xDFFF) return false;
+      out_.utf8(0x10000 + ((c - 0xD800) << 10) + (s[++i] - 0xDC00u));
+    } else {
+      if (c == 0xFFFE || c == 0xFFFF) return false;
+      out_.utf8(c);
     }
-    out_.commit(p);
   }
   return true;
 }
 
-bool Writer::number(const Number& n, size_t indent) {
-  constexpr size_t kRoom = 16 + xmlplist::kMaxRealText;
-  char* p = out_.reserve(indent + kRoom);
-  std::memset(p, '\t', indent);
-  p += indent;
+template <class Out>
+bool Walker<Out>::number(const Number& n) {
+  char buf[xmlplist::kMaxRealText];
   if (n.isReal()) {
-    std::memcpy(p, "<real>", 6);
-    p = xmlplist::formatReal(n.doubleValue(), p + 6);
-    std::memcpy(p, "</real>\n", 8);
-    out_.commit(p + 8);
+    out_.put("<real>");
+    out_.put({buf, size_t(xmlplist::formatReal(n.doubleValue(), buf) - buf)});
+    out_.put("</real>\n");
     return true;
   }
-  std::memcpy(p, "<integer>", 9);
-  p += 9;
-  p = n.isUnsigned() ? std::to_chars(p, p + 20, n.uint64Value()).ptr
-                     : std::to_chars(p, p + 20, n.int64Value()).ptr;
-  std::memcpy(p, "</integer>\n", 11);
-  out_.commit(p + 11);
+  auto end = n.isUnsigned() ? std::to_chars(buf, buf + sizeof buf, n.uint64Value()).ptr
+                            : std::to_chars(buf, buf + sizeof buf, n.int64Value()).ptr;
+  out_.put("<integer>");
+  out_.put({buf, size_t(end - buf)});
+  out_.put("</integer>\n");
   return true;
 }
 
-bool Writer::date(const Date& d, size_t indent) {
+template <class Out>
+bool Walker<Out>::date(const Date& d) {
   if (!std::isfinite(d.secondsSinceReference())) return false;
   std::string iso = d.iso8601();
   // Years before 0 or after 9999 have no form that readers accept.
   if (!Date::fromISO8601(iso)) return false;
-  line(indent, "<date>");
-  out_.append(iso.data(), iso.size());
-  put("</date>\n");
+  out_.put("<date>");
+  out_.put(iso);
+  out_.put("</date>\n");
   return true;
 }
 
-void Writer::data(const Data& d, size_t indent) {
+template <class Out>
+void Walker<Out>::data(const Data& d, size_t indent) {
   // "<data>", then the base64 in lines of kBase64LineLength characters at the
   // element's own indentation, then "</data>".
   constexpr size_t kLineBytes = xmlplist::kBase64LineLength / 4 * 3;
-  line(indent, "<data>\n");
+  out_.put("<data>\n");
   const uint8_t* bytes = d.bytes();
   for (size_t left = d.length(); left > 0;) {
     size_t n = std::min(left, kLineBytes);
-    char* p = out_.reserve(indent + xmlplist::kBase64LineLength + 1);
-    std::memset(p, '\t', indent);
-    p = xmlplist::encodeBase64(bytes, n, p + indent);
-    *p++ = '\n';
-    out_.commit(p);
+    out_.tabs(indent);
+    out_.base64(bytes, n);
+    out_.put("\n");
     bytes += n;
     left -= n;
   }
-  line(indent, "</data>\n");
+  out_.tabs(indent);
+  out_.put("</data>\n");
 }
 
-bool Writer::array(const Array& a, size_t depth) {
-  size_t indent = depth - 1;
+template <class Out>
+bool Walker<Out>::array(const Array& a, size_t depth) {
   if (a.isEmpty()) {
-    line(indent, "<array/>\n");
+    out_.put("<array/>\n");
     return true;
   }
-  line(indent, "<array>\n");
+  out_.put("<array>\n");
   for (const auto& item : a)
     if (!value(*item, depth + 1)) return false;
-  line(indent, "</array>\n");
+  out_.tabs(depth - 1);
+  out_.put("</array>\n");
   return true;
 }
 
-bool Writer::dictionary(const Dictionary& d, size_t depth) {
-  size_t indent = depth - 1;
+template <class Out>
+bool Walker<Out>::dictionary(const Dictionary& d, size_t depth) {
   if (d.isEmpty()) {
-    line(indent, "<dict/>\n");
+    out_.put("<dict/>\n");
     return true;
   }
   size_t first = entries_.size();
@@ -256,30 +284,58 @@ bool Writer::dictionary(const Dictionary& d, size_t depth) {
       stringKeys = false;
   });
   if (!stringKeys) return false;
-  std::sort(entries_.begin() + ptrdiff_t(first), entries_.end(),
-            [](const auto& a, const auto& b) { return a.first->compare(*b.first) < 0; });
-  line(indent, "<dict>\n");
+  if constexpr (Out::kSortsKeys)
+    std::sort(entries_.begin() + ptrdiff_t(first), entries_.end(),
+              [](const auto& a, const auto& b) { return a.first->compare(*b.first) < 0; });
+  out_.put("<dict>\n");
   // Index rather than iterate: nested dictionaries append to entries_.
   for (size_t i = first, end = entries_.size(); i < end; ++i) {
-    line(indent + 1, "<key>");
+    out_.tabs(depth);
+    out_.put("<key>");
     if (!text(*entries_[i].first)) return false;
-    put("</key>\n");
+    out_.put("</key>\n");
     if (!value(*entries_[i].second, depth + 1)) return false;
   }
   entries_.resize(first);
-  line(indent, "</dict>\n");
+  out_.tabs(depth - 1);
+  out_.put("</dict>\n");
   return true;
+}
+
+constexpr std::string_view kHead =
+    "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<plist version=\"1.0\">\n";
+constexpr std::string_view kTail = "</plist>\n";
+
+// Asks for huge pages behind a large output buffer that this writer alone
+// owns: where first touches of memory are costly (virtual machines), one
+// fault per 2 MiB instead of per 4 KiB is most of the writing time. Below
+// 32 MiB the allocator may serve the buffer from its shared heap, which is
+// left alone.
+void adviseHugePages(char* p, size_t n) noexcept {
+  constexpr uintptr_t kHuge = uintptr_t(2) << 20;
+  if (n < (size_t(32) << 20)) return;
+  uintptr_t begin = (reinterpret_cast<uintptr_t>(p) + kHuge - 1) & ~(kHuge - 1);
+  uintptr_t end = (reinterpret_cast<uintptr_t>(p) + n) & ~(kHuge - 1);
+  if (end > begin) madvise(reinterpret_cast<void*>(begin), end - begin, MADV_HUGEPAGE);
 }
 
 }  // namespace
 
 std::optional<std::string> writeXMLPropertyList(const Object& value) {
   try {
-    Writer w;
-    w.put("<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<plist version=\"1.0\">\n");
-    if (!w.value(value, 1)) return std::nullopt;
-    w.put("</plist>\n");
-    return w.finish();
+    Counter counter;
+    if (!Walker<Counter>(counter).value(value, 1)) return std::nullopt;
+    size_t size = kHead.size() + counter.size() + kTail.size();
+    std::string out;
+    out.reserve(size);
+    adviseHugePages(out.data(), size);
+    out.resize(size);
+    Printer printer(out.data(), out.data() + size);
+    printer.put(kHead);
+    if (!Walker<Printer>(printer).value(value, 1)) return std::nullopt;
+    printer.put(kTail);
+    if (!printer.filledExactly()) return std::nullopt;
+    return out;
   } catch (const std::bad_alloc&) {
     return std::nullopt;
   }

@@ -13,8 +13,8 @@
 
 using namespace qr;
 using qr::test::CapturedLog;
-using qr::test::FixtureCalls;
 using qr::test::fixtureBundle;
+using qr::test::FixtureCalls;
 
 namespace {
 
@@ -105,16 +105,19 @@ TEST_F(ModuleLoading, AFailedQueryIsLoggedWithCodeFacilityAndSeverityOnce) {
     EXPECT_FALSE(module->loadPluginInterface()) << "no second attempt";
     std::string expected = "Unble to obtain interface[" + url->absoluteString() +
                            ":(5D69ED5E-D5B5-11D3-9EFF-00050209D9C1,5EDEC4FA-D5B5-11D3-AAF2-"
-                           "00050209D9C1)]: " + c.message;
+                           "00050209D9C1)]: " +
+                           c.message;
     EXPECT_EQ(countContaining(log_.lines(), expected), 1u) << c.fixture;
     EXPECT_EQ(calls_.count(std::string(c.fixture) + " create"), 1u);
-    EXPECT_EQ(calls_.count(std::string(c.fixture) + " Release"), 1u) << "released after a failure too";
+    EXPECT_EQ(calls_.count(std::string(c.fixture) + " Release"), 1u)
+        << "released after a failure too";
   }
   EXPECT_EQ(QuarrinModuleFactory::loadFailures(), 3);
 }
 
 TEST_F(ModuleLoading, FailuresWithoutAnInterfaceAreCountedButNotAllLogged) {
-  for (const char* fixture : {"m_qi_null", "c_factory_null", "no_executable", "broken_executable"}) {
+  for (const char* fixture :
+       {"m_qi_null", "c_factory_null", "no_executable", "broken_executable"}) {
     auto module = QuarrinModuleFactory::pluginForURL(fixtureURL(fixture).get());
     ASSERT_TRUE(module) << fixture;
     EXPECT_FALSE(module->loadPluginInterface()) << fixture;
@@ -137,7 +140,8 @@ TEST_F(ModuleLoading, ThePlatformExceptionIsCaughtLoggedAndCountedOthersPassThro
 
   auto raisesInQuery = QuarrinModuleFactory::pluginForURL(fixtureURL("m_qi_raises").get());
   EXPECT_FALSE(raisesInQuery->loadPluginInterface());
-  EXPECT_FALSE(raisesInQuery->pluginInterface()) << "the interface stored before raising is dropped";
+  EXPECT_FALSE(raisesInQuery->pluginInterface())
+      << "the interface stored before raising is dropped";
   EXPECT_EQ(calls_.count("m_qi_raises Release"), 1u) << "the instance is still released";
   EXPECT_EQ(QuarrinModuleFactory::loadFailures(), 2);
 

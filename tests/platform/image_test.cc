@@ -23,7 +23,7 @@ namespace {
 
 using Pixels = std::vector<uint8_t>;  // RGBA, rows top to bottom
 
-struct PngSpec {
+struct PngLayout {
   uint32_t width, height;
   int colorType;
   int depth = 8;
@@ -33,7 +33,7 @@ struct PngSpec {
   std::vector<uint8_t> samples;  // packed rows as the file holds them
 };
 
-bool writePNG(const std::string& path, const PngSpec& spec) {
+bool writePNG(const std::string& path, const PngLayout& layout) {
   FILE* file = std::fopen(path.c_str(), "wb");
   if (!file) return false;
   png_structp png = png_create_write_struct(PNG_LIBPNG_VER_STRING, nullptr, nullptr, nullptr);
@@ -44,17 +44,18 @@ bool writePNG(const std::string& path, const PngSpec& spec) {
     return false;
   }
   png_init_io(png, file);
-  png_set_IHDR(png, info, spec.width, spec.height, spec.depth, spec.colorType,
-               spec.interlaced ? PNG_INTERLACE_ADAM7 : PNG_INTERLACE_NONE,
+  png_set_IHDR(png, info, layout.width, layout.height, layout.depth, layout.colorType,
+               layout.interlaced ? PNG_INTERLACE_ADAM7 : PNG_INTERLACE_NONE,
                PNG_COMPRESSION_TYPE_DEFAULT, PNG_FILTER_TYPE_DEFAULT);
-  if (!spec.palette.empty()) png_set_PLTE(png, info, spec.palette.data(), int(spec.palette.size()));
-  if (!spec.transparency.empty())
-    png_set_tRNS(png, info, spec.transparency.data(), int(spec.transparency.size()), nullptr);
+  if (!layout.palette.empty())
+    png_set_PLTE(png, info, layout.palette.data(), int(layout.palette.size()));
+  if (!layout.transparency.empty())
+    png_set_tRNS(png, info, layout.transparency.data(), int(layout.transparency.size()), nullptr);
   png_write_info(png, info);
   size_t rowBytes = png_get_rowbytes(png, info);
-  std::vector<png_bytep> rows(spec.height);
-  for (uint32_t y = 0; y < spec.height; ++y)
-    rows[y] = const_cast<png_bytep>(spec.samples.data() + y * rowBytes);
+  std::vector<png_bytep> rows(layout.height);
+  for (uint32_t y = 0; y < layout.height; ++y)
+    rows[y] = const_cast<png_bytep>(layout.samples.data() + y * rowBytes);
   png_write_image(png, rows.data());
   png_write_end(png, nullptr);
   png_destroy_write_struct(&png, &info);

@@ -34,7 +34,7 @@ void* interfaceOf(const char* fixture, const char* type, const char* interfaceID
   return interface;
 }
 
-// Serves two lookup specs; refCon must be the value handed to Initialize.
+// Serves two lookup dictionaries; refCon must be the value handed to Initialize.
 int32_t serveLookupSpec(void* refCon, uint32_t index, QrDictionaryRef* lookup) {
   if (refCon != &serveLookupSpec) return -9540;
   if (index >= 2) return -30882;

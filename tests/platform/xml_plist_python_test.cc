@@ -8,7 +8,6 @@
 #include <cinttypes>
 #include <cmath>
 #include <cstring>
-#include <filesystem>
 #include <fstream>
 #include <sstream>
 #include <string>
@@ -22,6 +21,7 @@
 #include "platform/number.h"
 #include "platform/property_list.h"
 #include "platform/string.h"
+#include "support/temp_dir.h"
 
 using namespace qr;
 
@@ -180,12 +180,6 @@ class PythonInterop : public ::testing::Test {
   static void SetUpTestSuite() { available_ = runPython({"read"}).status != 127; }
   void SetUp() override {
     if (!available_) GTEST_SKIP() << "python3 is not installed";
-    char pattern[] = "/tmp/quarrin-plistlib-XXXXXX";
-    ASSERT_TRUE(mkdtemp(pattern));
-    dir_ = pattern;
-  }
-  void TearDown() override {
-    if (!dir_.empty()) std::filesystem::remove_all(dir_);
   }
 
   // plistlib's readings of what our writer makes of the values.
@@ -194,7 +188,7 @@ class PythonInterop : public ::testing::Test {
     for (size_t i = 0; i < values.size(); ++i) {
       auto xml = writeXMLPropertyList(*values[i]);
       if (!xml) return {"(not written)"};
-      args.push_back(dir_ + "/ours" + std::to_string(i) + ".xml");
+      args.push_back(dir_ / ("ours" + std::to_string(i) + ".xml"));
       std::ofstream(args.back(), std::ios::binary) << *xml;
     }
     PythonRun run = runPython(args);
@@ -203,7 +197,7 @@ class PythonInterop : public ::testing::Test {
   }
 
   static bool available_;
-  std::string dir_;
+  qrtest::TempDir dir_;
 };
 
 bool PythonInterop::available_ = false;
@@ -211,13 +205,13 @@ bool PythonInterop::available_ = false;
 }  // namespace
 
 TEST_F(PythonInterop, WeReadWhatPlistlibWritesAndItReadsWhatWeWrite) {
-  PythonRun run = runPython({"write", dir_});
+  PythonRun run = runPython({"write", dir_.path()});
   ASSERT_EQ(run.status, 0);
   auto expected = lines(run.out);
   ASSERT_EQ(expected.size(), 10u);
   std::vector<Ref<Object>> ours;
   for (size_t i = 0; i < expected.size(); ++i) {
-    std::ifstream in(dir_ + "/" + std::to_string(i) + ".xml", std::ios::binary);
+    std::ifstream in(dir_ / (std::to_string(i) + ".xml"), std::ios::binary);
     std::string xml((std::istreambuf_iterator<char>(in)), std::istreambuf_iterator<char>());
     for (auto m : {Mutability::MutableContainersAndLeaves, Mutability::Immutable}) {
       auto value = readXMLPropertyList(xml, m);

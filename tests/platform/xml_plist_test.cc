@@ -13,10 +13,10 @@
 #include "platform/string.h"
 #include "platform/url.h"
 #include "platform/uuid.h"
-#include "plist_identity.h"
+#include "support/plist_identity.h"
 
 using namespace qr;
-using qr::testing::identical;
+using qrtest::identical;
 
 namespace {
 
@@ -174,14 +174,44 @@ TEST(XMLPropertyList, ReadsWhatOtherWritersProduce) {
   EXPECT_EQ(cast<String>(read(bytes))->utf8(), "\xF0\x9F\x96\xA8");
 }
 
-TEST(XMLPropertyList, RepeatedKeysShareOneObject) {
-  auto v =
-      cast<Array>(readValue("<array><dict><key>Make</key><true/></dict>"
-                            "<dict><key>Make</key><false/></dict></array>"));
+TEST(XMLPropertyList, RepeatedKeysAndShortStringsShareOneObjectUnlessMutable) {
+  std::string xml = plist(
+      "<array><dict><key>Make</key><string>Acme</string></dict>"
+      "<dict><key>Make</key><string>Acme</string></dict></array>");
+  auto v = cast<Array>(read(xml));
   ASSERT_TRUE(v);
-  auto k0 = cast<Dictionary>(v->at(0))->keys()[0];
-  auto k1 = cast<Dictionary>(v->at(1))->keys()[0];
-  EXPECT_EQ(k0.get(), k1.get());
+  auto* d0 = cast<Dictionary>(v->at(0));
+  auto* d1 = cast<Dictionary>(v->at(1));
+  EXPECT_EQ(d0->keys()[0].get(), d1->keys()[0].get());
+  EXPECT_EQ(d0->get("Make"), d1->get("Make"));
+  auto m = cast<Array>(read(xml, Mutability::MutableContainersAndLeaves));
+  auto* s0 = cast<MutableString>(cast<Dictionary>(m->at(0))->get("Make"));
+  auto* s1 = cast<MutableString>(cast<Dictionary>(m->at(1))->get("Make"));
+  ASSERT_TRUE(s0 && s1);
+  EXPECT_NE(s0, s1) << "each mutable leaf is its own object";
+  s0->appendUTF8("!");
+  EXPECT_EQ(s1->utf8(), "Acme");
+}
+
+TEST(XMLPropertyList, EscapesAtEveryPositionOfShortAndLongText) {
+  // The writer scans text in blocks; a character needing an escape, or one
+  // that XML cannot carry, must be found wherever it sits.
+  for (size_t length = 1; length <= 40; ++length) {
+    for (size_t at = 0; at < length; ++at) {
+      for (char c : {'&', '<', '>', '\r', '\t', '\n'}) {
+        std::string text(length, 'x');
+        text[at] = c;
+        auto xml = writeXMLPropertyList(*String::make(text));
+        ASSERT_TRUE(xml);
+        auto back = cast<String>(read(*xml));
+        ASSERT_TRUE(back) << *xml;
+        EXPECT_EQ(back->utf8(), text) << *xml;
+      }
+      std::string bad(length, 'x');
+      bad[at] = '\x1F';
+      EXPECT_FALSE(writeXMLPropertyList(*String::make(bad))) << length << " " << at;
+    }
+  }
 }
 
 TEST(XMLPropertyList, RejectsMalformedOrUnsafeDocuments) {

@@ -8,34 +8,36 @@
 #include "platform/dictionary.h"
 #include "platform/number.h"
 
-namespace qr::testing {
+namespace qrtest {
 
-inline bool identical(const Object* a, const Object* b) {
+inline bool identical(const qr::Object* a, const qr::Object* b) {
   if (!a || !b) return a == b;
   if (a->kind() != b->kind()) return false;
   switch (a->kind()) {
-    case TypeKind::Number: {
-      const auto& x = static_cast<const Number&>(*a);
-      const auto& y = static_cast<const Number&>(*b);
+    case qr::TypeKind::Number: {
+      const auto& x = static_cast<const qr::Number&>(*a);
+      const auto& y = static_cast<const qr::Number&>(*b);
       if (x.isReal() != y.isReal() || x.isUnsigned() != y.isUnsigned()) return false;
       if (!x.isReal()) return x.uint64Value() == y.uint64Value();
       double p = x.doubleValue(), q = y.doubleValue();
       return (std::isnan(p) && std::isnan(q)) || (p == q && std::signbit(p) == std::signbit(q));
     }
-    case TypeKind::Array: {
-      const auto& x = static_cast<const Array&>(*a);
-      const auto& y = static_cast<const Array&>(*b);
+    case qr::TypeKind::Array: {
+      const auto& x = static_cast<const qr::Array&>(*a);
+      const auto& y = static_cast<const qr::Array&>(*b);
       if (x.count() != y.count()) return false;
       for (size_t i = 0; i < x.count(); ++i)
         if (!identical(x.at(i), y.at(i))) return false;
       return true;
     }
-    case TypeKind::Dictionary: {
-      const auto& x = static_cast<const Dictionary&>(*a);
-      const auto& y = static_cast<const Dictionary&>(*b);
+    case qr::TypeKind::Dictionary: {
+      const auto& x = static_cast<const qr::Dictionary&>(*a);
+      const auto& y = static_cast<const qr::Dictionary&>(*b);
       if (x.count() != y.count()) return false;
       bool same = true;
-      x.forEach([&](const Object& k, const Object& v) { same = same && identical(&v, y.get(k)); });
+      x.forEach([&](const qr::Object& k, const qr::Object& v) {
+        same = same && identical(&v, y.get(k));
+      });
       return same;
     }
     default:
@@ -43,4 +45,4 @@ inline bool identical(const Object* a, const Object* b) {
   }
 }
 
-}  // namespace qr::testing
+}  // namespace qrtest
