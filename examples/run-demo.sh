@@ -38,6 +38,14 @@ trace=$work/loaded.txt
 cp "$demo/printing-prefs.plist" "$store"
 rm -f "$cache_file"
 
+# With no framework and no store, stream mode prints an empty cache.
+echo '$ cachewright -s < /dev/null   (no framework, no store)'
+status=0
+CACHEWRIGHT_FRAMEWORK=$work/none CACHEWRIGHT_PREFS=$work/none/prefs.plist \
+  "$cachewright" -s </dev/null 2>&1 || status=$?
+echo "exit $status"
+echo
+
 export CACHEWRIGHT_FRAMEWORK=$demo/Zephrin.framework
 export CACHEWRIGHT_PREFS=$store
 # The sample plug-ins note here each time their code is loaded.
