@@ -70,12 +70,16 @@ class Demo : public ::testing::Test {
 TEST_F(Demo, ColdRunsLoadEveryModuleAndTheWarmRunNone) {
   ASSERT_EQ(result_->status, 0) << result_->err;
   auto runs = linesStartingWith("$ cachewright");
-  ASSERT_EQ(runs.size(), 3u) << result_->out;
+  ASSERT_EQ(runs.size(), 4u) << result_->out;
+  EXPECT_NE(runs[0].find("cachewright -s < /dev/null"), std::string::npos) << runs[0];
+  EXPECT_NE(result_->out.find("<plist version=\"1.0\">\n<dict/>\n</plist>\nexit 0\n"),
+            std::string::npos)
+      << "stream mode with nothing installed prints an empty cache";
   const std::string all = "plug-ins loaded: AurelLaser BriskInkjet CorvoLabel DNSSD USB";
-  EXPECT_NE(runs[0].find("exit 1 (cache stored); " + all), std::string::npos) << runs[0];
-  EXPECT_NE(runs[1].find("exit 0 (file written); " + all), std::string::npos) << runs[1];
-  EXPECT_NE(runs[2].find("exit 1 (cache stored); plug-ins loaded: none"), std::string::npos)
-      << runs[2];
+  EXPECT_NE(runs[1].find("exit 1 (cache stored); " + all), std::string::npos) << runs[1];
+  EXPECT_NE(runs[2].find("exit 0 (file written); " + all), std::string::npos) << runs[2];
+  EXPECT_NE(runs[3].find("exit 1 (cache stored); plug-ins loaded: none"), std::string::npos)
+      << runs[3];
   EXPECT_NE(result_->out.find("(after the warm run the store holds the same cache as before)"),
             std::string::npos);
   // No run had anything to complain about.
