@@ -14,10 +14,10 @@
 // clang-format on
 
 #include "platform/image.h"
-#include "test_files.h"
+#include "support/temp_dir.h"
 
 using namespace qr;
-using qr::testing::TempDir;
+using qrtest::TempDir;
 
 namespace {
 
@@ -184,7 +184,7 @@ std::string stderrOf(const TempDir& dir, F&& f) {
   std::fflush(stderr);
   dup2(saved, 2);
   close(saved);
-  return readFile(path).value_or("");
+  return qrtest::readText(path);
 }
 
 uint32_t crc32Of(std::string_view bytes) {
@@ -296,7 +296,7 @@ TEST(Image, AnythingButAWholeImageGivesNoneAndPrintsNothing) {
   ASSERT_TRUE(writeTIFF(tiff, 40, 40, 4, EXTRASAMPLE_UNASSALPHA, rgba));
 
   auto truncated = [&](const std::string& whole, const std::string& name) {
-    std::string bytes = *readFile(whole);
+    std::string bytes = qrtest::readText(whole);
     return dir.write(name, std::string_view(bytes).substr(0, bytes.size() * 3 / 5));
   };
   std::string pngHeader = "\x89PNG\r\n\x1a\n";
