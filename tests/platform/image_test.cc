@@ -5,6 +5,7 @@
 #include <png.h>
 #include <tiffio.h>
 #include <unistd.h>
+#include <zlib.h>
 
 #include <array>
 #include <csetjmp>
@@ -187,21 +188,13 @@ std::string stderrOf(const TempDir& dir, F&& f) {
   return qrtest::readText(path);
 }
 
-uint32_t crc32Of(std::string_view bytes) {
-  uint32_t crc = 0xFFFFFFFF;
-  for (unsigned char c : bytes) {
-    crc ^= c;
-    for (int k = 0; k < 8; ++k) crc = (crc >> 1) ^ (0xEDB88320 & (0u - (crc & 1)));
-  }
-  return ~crc;
-}
-
 std::string pngChunk(std::string_view type, std::string_view body) {
   auto be32 = [](uint32_t v) {
     return std::string{char(v >> 24), char(v >> 16), char(v >> 8), char(v)};
   };
   std::string typed = std::string(type) + std::string(body);
-  return be32(uint32_t(body.size())) + typed + be32(crc32Of(typed));
+  return be32(uint32_t(body.size())) + typed +
+         be32(uint32_t(crc32(0, reinterpret_cast<const Bytef*>(typed.data()), uInt(typed.size()))));
 }
 
 }  // namespace
@@ -210,8 +203,9 @@ TEST(Image, PNGOfEveryColourKindComesBackAsRGBA) {
   TempDir dir;
   // 8-bit RGBA with varied alpha, plain and interlaced.
   Pixels rgba = rgbaTestPattern(9, 7);
+  // The format is told by content, not by name.
   for (bool interlaced : {false, true}) {
-    std::string path = dir / (interlaced ? "adam7.png" : "rgba.png");
+    std::string path = dir / (interlaced ? "adam7.png" : "rgba.tiff");
     ASSERT_TRUE(writePNG(path, {9, 7, PNG_COLOR_TYPE_RGBA, 8, interlaced, {}, {}, rgba}));
     expectConverted(dir, path, 9, 7, rgba);
   }
@@ -273,14 +267,6 @@ TEST(Image, TIFFComesBackWithItsAlphaUnassociated) {
   path = dir / "rgb.tif";
   ASSERT_TRUE(writeTIFF(path, 2, 1, 3, 0, {1, 2, 3, 250, 251, 252}));
   expectConverted(dir, path, 2, 1, {1, 2, 3, 255, 250, 251, 252, 255});
-}
-
-TEST(Image, FormatIsToldByContentNotByName) {
-  TempDir dir;
-  Pixels rgba = rgbaTestPattern(3, 3);
-  std::string path = dir / "icon.tiff";
-  ASSERT_TRUE(writePNG(path, {3, 3, PNG_COLOR_TYPE_RGBA, 8, false, {}, {}, rgba}));
-  expectConverted(dir, path, 3, 3, rgba);
 }
 
 TEST(Image, AnythingButAWholeImageGivesNoneAndPrintsNothing) {
