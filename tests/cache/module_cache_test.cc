@@ -8,8 +8,8 @@
 #include <cstdlib>
 #include <filesystem>
 
+#include "fixtures/fixture_support.h"
 #include "platform/data.h"
-#include "platform/log.h"
 #include "platform/property_list.h"
 #include "support/temp_dir.h"
 
@@ -22,9 +22,7 @@ class ModuleCache : public ::testing::Test {
   void SetUp() override {
     setenv("CACHEWRIGHT_PREFS", (dir_ / "prefs.plist").c_str(), 1);
     setenv("CACHEWRIGHT_FRAMEWORK", (dir_ / "Zephrin.framework").c_str(), 1);
-    previousSink_ = setLogSink([this](std::string_view line) { logged_.emplace_back(line); });
   }
-  void TearDown() override { setLogSink(previousSink_); }
 
   // A module bundle with the given short version (none when empty).
   Ref<URL> module(const std::string& name, std::string_view version) {
@@ -33,7 +31,6 @@ class ModuleCache : public ::testing::Test {
                       qrtest::infoPlist("com.example." + name, version));
     return URL::fileURL(path, true);
   }
-  void setVersion(const std::string& name, std::string_view version) { module(name, version); }
 
   // A cache that starts from an empty dictionary instead of loading the store.
   std::unique_ptr<QuarrinModuleCache> emptyCache() {
@@ -53,14 +50,21 @@ class ModuleCache : public ::testing::Test {
   }
 
   size_t countLogged(std::string_view text) const {
-    size_t n = 0;
-    for (const auto& line : logged_) n += line.find(text) != std::string::npos;
-    return n;
+    return std::ranges::count_if(log_.lines(), [&](const std::string& line) {
+      return line.find(text) != std::string::npos;
+    });
+  }
+  // A descriptor reading the bytes given.
+  static int pipeWith(std::string_view bytes) {
+    int ends[2];
+    if (pipe(ends) != 0) return -1;
+    if (write(ends[1], bytes.data(), bytes.size()) != ssize_t(bytes.size())) std::abort();
+    close(ends[1]);
+    return ends[0];
   }
 
   qrtest::TempDir dir_;
-  std::vector<std::string> logged_;
-  LogSink previousSink_;
+  qr::test::CapturedLog log_;
 };
 
 TEST_F(ModuleCache, AnEntryIsCurrentOnlyWhileTheBundleVersionIsUnchanged) {
@@ -72,7 +76,7 @@ TEST_F(ModuleCache, AnEntryIsCurrentOnlyWhileTheBundleVersionIsUnchanged) {
   ASSERT_TRUE(cache->getInfoForPrinterModule(url.get(), usb.get()));
   cache->setDirty(false);
 
-  setVersion("Laser", "1.1");
+  module("Laser", "1.1");
   EXPECT_FALSE(cache->getInfoForPrinterModule(url.get(), usb.get()));
   EXPECT_TRUE(cache->dirty());
   EXPECT_EQ(cache->cacheDictionary()->count(), 0u) << "the whole entry goes, every connection";
@@ -140,9 +144,11 @@ TEST_F(ModuleCache, NilInfoIsARecordedEmptyAnswerAndNilConnectionStoresNothing) 
   auto* entry = cache->cacheDictionary()->getAs<Dictionary>(other->absoluteString());
   ASSERT_TRUE(entry);
   EXPECT_EQ(entry->count(), 0u) << "neither value nor version";
+  cache->setDirty(false);
   EXPECT_FALSE(cache->getInfoForPrinterModule(other.get(), usb.get()))
       << "an entry without a version is never current";
   EXPECT_FALSE(cache->cacheDictionary()->get(other->absoluteString())) << "and is dropped";
+  EXPECT_TRUE(cache->dirty());
 }
 
 TEST_F(ModuleCache, IOModuleEntriesKeepEarlierValuesAndAlwaysTheirVersion) {
@@ -179,20 +185,6 @@ TEST_F(ModuleCache, AMissingShortVersionIsLoggedAtEveryAddAndLookup) {
   // The stale entry is gone, so a lookup finds nothing to compare and logs nothing.
   EXPECT_FALSE(cache->getInfoForPrinterModule(url.get(), usb.get()));
   EXPECT_EQ(countLogged("Module is missing short version"), 3u);
-}
-
-TEST_F(ModuleCache, AHandEditedEntryWithoutVersionIsDroppedAtItsFirstLookup) {
-  auto cache = std::make_unique<QuarrinModuleCache>();
-  auto url = module("Edited", "1");
-  auto dict = make<MutableDictionary>();
-  auto entry = make<MutableDictionary>();
-  entry->set("USB", make<MutableArray>());
-  dict->set(url->absoluteString(), entry);
-  cache->setCacheDict(dict);
-  cache->setDirty(false);
-  EXPECT_FALSE(cache->getInfoForPrinterModule(url.get(), String::make("USB").get()));
-  EXPECT_TRUE(cache->dirty());
-  EXPECT_EQ(cache->cacheDictionary()->count(), 0u);
 }
 
 TEST_F(ModuleCache, TheChangedFlagFollowsLoadingWritingAndEqualReplacement) {
@@ -245,19 +237,12 @@ TEST_F(ModuleCache, AStoredCacheWinsOverTheDefaultResource) {
 
 TEST_F(ModuleCache, ReadingEmptyOrUnparsableInputChangesNothing) {
   QuarrinModuleCache cache;
-  int empty[2];
-  ASSERT_EQ(pipe(empty), 0);
-  close(empty[1]);
-  EXPECT_FALSE(cache.readFromFd(empty[0]));
-  close(empty[0]);
-
-  int garbage[2];
-  ASSERT_EQ(pipe(garbage), 0);
-  ASSERT_EQ(write(garbage[1], "{{{", 3), 3);
-  close(garbage[1]);
-  EXPECT_FALSE(cache.readFromFd(garbage[0]));
-  close(garbage[0]);
-  EXPECT_TRUE(logged_.empty());
+  for (std::string_view input : {"", "{{{"}) {
+    int fd = pipeWith(input);
+    EXPECT_FALSE(cache.readFromFd(fd)) << input;
+    close(fd);
+  }
+  EXPECT_TRUE(log_.lines().empty());
   EXPECT_FALSE(cache.dirty());
 }
 
@@ -275,8 +260,7 @@ TEST_F(ModuleCache, WhatIsWrittenToADescriptorReadsBackEqualInAFreshProcess) {
   pid_t child = fork();
   if (child == 0) {
     QuarrinModuleCache fresh;
-    int in = open(file.c_str(), O_RDONLY);
-    bool changed = fresh.readFromFd(in);
+    bool changed = fresh.readFromFd(open(file.c_str(), O_RDONLY));
     _exit(changed && fresh.cacheDictionary()->isEqual(*expected) ? 0 : 1);
   }
   int status = 0;

@@ -2,6 +2,8 @@
 // as optional UTF-8, so that "no value" and "empty" stay apart in assertions.
 #pragma once
 
+#include <gtest/gtest.h>
+
 #include <optional>
 #include <string>
 #include <string_view>
@@ -31,6 +33,19 @@ inline qr::Ref<qr::String> wideASCII(std::string_view ascii) {
   m->append(std::u16string_view(u"\u00e9"));
   m->replace(0, 1, *qr::String::make(ascii));
   return m;
+}
+
+// One row of a table: an input and what an operation should give for it.
+struct Case {
+  std::string_view input;
+  std::optional<std::string> expected;
+};
+
+// Applies the operation to each input, naming the operation and input on failure.
+template <class Op>
+void expectCases(std::string_view name, Op op, std::initializer_list<Case> cases) {
+  for (const Case& c : cases)
+    EXPECT_EQ(text(op(*S(c.input))), c.expected) << name << " of \"" << c.input << "\"";
 }
 
 }  // namespace deviceid_test

@@ -10,91 +10,77 @@ using namespace deviceid_test;
 using namespace PMStringAdditions;
 using std::nullopt;
 
-TEST(ProductRule, MakeAndModelFromTheProductValue) {
-  auto id = S("product:(Hewlett-Packard LaserJet 4000)");
-  EXPECT_EQ(text(make(*id)), "Hewlett-Packard");
-  EXPECT_EQ(text(model(*id)), "LaserJet 4000");
-  EXPECT_EQ(text(product(*id)), "(HP LaserJet 4000)");
-  EXPECT_EQ(text(deviceName(*id)), "HP LaserJet 4000");
-  // Outer characters are dropped without testing them.
-  EXPECT_EQ(text(make(*S("product:<Acme Jet 5]"))), "Acme");
-  EXPECT_EQ(text(model(*S("product:<Acme Jet 5]"))), "Jet 5");
-}
-
-TEST(ProductRule, DeskjetBelongsToHP) {
-  auto id = S("product:(deskjet 990c)");
-  EXPECT_EQ(text(make(*id)), "hp");
-  EXPECT_EQ(text(model(*id)), "deskjet 990c");
-  EXPECT_EQ(text(product(*id)), "(deskjet 990c)");
-  EXPECT_EQ(text(deviceName(*id)), "hp deskjet 990c");
-  EXPECT_EQ(text(make(*S("product:(Deskjet 990c)"))), "Deskjet") << "prefix is case-sensitive";
-  EXPECT_EQ(text(model(*S("product:(deskjet"))), "deskje");
-}
-
-TEST(ProductRule, OpenCasesGiveNoValueAndNeverReadOutOfBounds) {
-  // No product, an empty one, no space.
-  EXPECT_EQ(text(make(*S("product:"))), nullopt);
-  EXPECT_EQ(text(model(*S("product:"))), nullopt);
-  EXPECT_EQ(text(make(*S("product:(Acme)"))), nullopt);
-  EXPECT_EQ(text(model(*S("product:x"))), nullopt);
-  // First space first: no make; first space last: no model.
-  EXPECT_EQ(text(make(*S("product: Acme)"))), nullopt);
-  EXPECT_EQ(text(model(*S("product: Acme)"))), "Acme");
-  EXPECT_EQ(text(make(*S("product:(Acme "))), "Acme");
-  EXPECT_EQ(text(model(*S("product:(Acme "))), nullopt);
-  EXPECT_EQ(text(make(*S("product: "))), nullopt);
-  EXPECT_EQ(text(model(*S("product: "))), nullopt);
-  // One character of room on either side gives empty parts, not failures.
-  EXPECT_EQ(text(make(*S("product:( x)"))), "");
-  EXPECT_EQ(text(model(*S("product:(x )"))), "");
-  EXPECT_EQ(text(softwareUpdateScaneID(*S("product:( )"))), "MANUFACTURER:;MODEL:");
-  // Make and model keys win over the product value; "ty:" comes before it for the model.
-  EXPECT_EQ(text(model(*S("product:(A B);ty:T"))), "T");
-  EXPECT_EQ(text(make(*S("product:(A B);MFG:M"))), "M");
-}
-
-TEST(ProductRule, SurrogatePairsCountAsTwoUnits) {
+TEST(ProductRule, MakeAndModelFromTheProductValueAndItsOpenCases) {
+  expectCases("make", make,
+              {
+                  {"product:(Hewlett-Packard LaserJet 4000)", "Hewlett-Packard"},
+                  {"product:<Acme Jet 5]", "Acme"},       // outer characters dropped untested
+                  {"product:(deskjet 990c)", "hp"},       // deskjet belongs to HP
+                  {"product:(Deskjet 990c)", "Deskjet"},  // the prefix is case-sensitive
+                  // No product, an empty one, no space, a first space first: no make.
+                  {"product:", nullopt},
+                  {"product:(Acme)", nullopt},
+                  {"product: Acme)", nullopt},
+                  {"product: ", nullopt},
+                  {"product:(Acme ", "Acme"},
+                  {"product:( x)", ""},          // one character of room gives an empty part
+                  {"product:(A B);MFG:M", "M"},  // make keys win over the product value
+              });
+  expectCases("model", model,
+              {
+                  {"product:(Hewlett-Packard LaserJet 4000)", "LaserJet 4000"},
+                  {"product:<Acme Jet 5]", "Jet 5"},
+                  {"product:(deskjet 990c)", "deskjet 990c"},
+                  {"product:(deskjet", "deskje"},
+                  // No product, no space, a first space last: no model.
+                  {"product:", nullopt},
+                  {"product:x", nullopt},
+                  {"product:(Acme ", nullopt},
+                  {"product: ", nullopt},
+                  {"product: Acme)", "Acme"},
+                  {"product:(x )", ""},
+                  {"product:(A B);ty:T", "T"},  // "ty:" comes before the product value
+                  {"product:(Acme \xF0\x9F\x96\xA8)", "\xF0\x9F\x96\xA8"},
+              });
   // The model drops the last code unit, so a trailing pair loses its low half.
-  auto id = S("product:(Acme \xF0\x9F\x96\xA8)");
-  EXPECT_EQ(text(model(*id)), "\xF0\x9F\x96\xA8");
   auto split = model(*S("product:(Acme Jet\xF0\x9F\x96\xA8"));
   ASSERT_TRUE(split);
   EXPECT_EQ(split->length(), 4u);
   EXPECT_EQ(split->at(3), 0xD83D);
 }
 
-TEST(Product, ProductValueElseParenthesisedMakeAndModel) {
-  EXPECT_EQ(text(product(*S("MFG:HP;MDL:LaserJet 4000;CMD:PJL,PCL,POSTSCRIPT;"))),
-            "(HP LaserJet 4000)");
-  EXPECT_EQ(text(product(*S("MFG: HP ;MDL:X "))), "( HP  X )") << "not trimmed";
-  EXPECT_EQ(text(product(*S("MFG:HP"))), "") << "empty, not null, without a model";
-  EXPECT_EQ(text(product(*S(""))), "");
-  EXPECT_EQ(text(product(*S("product:anything at all;MFG:Z;MDL:Y"))), "anything at all");
+TEST(Product, ProductValueElseParenthesisedMakeAndModelThenCleanUp) {
+  expectCases(
+      "product", product,
+      {
+          {"product:(Hewlett-Packard LaserJet 4000)", "(HP LaserJet 4000)"},
+          {"product:(deskjet 990c)", "(deskjet 990c)"},
+          {"MFG:HP;MDL:LaserJet 4000;CMD:PJL,PCL,POSTSCRIPT;", "(HP LaserJet 4000)"},
+          {"MFG: HP ;MDL:X ", "( HP  X )"},  // not trimmed
+          {"MFG:HP", ""},                    // empty, not null, without a model
+          {"", ""},
+          {"product:anything at all;MFG:Z;MDL:Y", "anything at all"},
+          // Each clean-up group makes at most one replacement, in table order.
+          {"product:(HP HP LaserJet)", "(HP LaserJet)"},
+          {"product:(hewlett-packard hp 5)", "(HP 5)"},
+          {"product:(Hewlett-Packard HPX)", "(HPX)"},  // no space needed
+          {"product:(Hewlett-Packard Jet)", "(HP Jet)"},
+          // Group 1 stops after its first hit; the third row would match the leftover.
+          {"product:(HP HP (Hewlett-Packard X)", "(HP (Hewlett-Packard X)"},
+          {"product:(HP HP (HP HP)", "(HP (HP HP)"},  // only the first occurrence
+          // Both groups apply, group 1 first.
+          {"product:(Lexmark International Lexmark T (Hewlett-Packard Z)", "(Lexmark T (HP Z)"},
+          {"product:(LEXMARK INTERNATIONAL E)", "(Lexmark E)"},
+          {"product:(Lexmark Lexmark C)", "(Lexmark C)"},
+          {"product:[HP HP 1]", "[HP HP 1]"},  // the parenthesised form needs its parenthesis
+          // Case folding reaches non-ASCII letters that fold to ASCII (Kelvin sign).
+          {"product:(Hewlett-Pac\xE2\x84\xAA"
+           "ard Jet)",
+           "(HP Jet)"},
+      });
   auto p = product(*S("MFG:a;MDL:b"));
   p->appendUTF8("!");  // the result is the caller's own mutable string
   EXPECT_EQ(text(p), "(a b)!");
-}
-
-TEST(CleanUp, EachGroupMakesAtMostOneReplacementInTableOrder) {
-  EXPECT_EQ(text(product(*S("product:(HP HP LaserJet)"))), "(HP LaserJet)");
-  EXPECT_EQ(text(product(*S("product:(hewlett-packard hp 5)"))), "(HP 5)");
-  EXPECT_EQ(text(product(*S("product:(Hewlett-Packard HPX)"))), "(HPX)") << "no space needed";
-  EXPECT_EQ(text(product(*S("product:(Hewlett-Packard Jet)"))), "(HP Jet)");
-  // Group 1 stops after its first hit; the third row would match the leftover.
-  EXPECT_EQ(text(product(*S("product:(HP HP (Hewlett-Packard X)"))), "(HP (Hewlett-Packard X)");
-  // Only the first occurrence is replaced.
-  EXPECT_EQ(text(product(*S("product:(HP HP (HP HP)"))), "(HP (HP HP)");
-  // Both groups apply, group 1 first.
-  EXPECT_EQ(text(product(*S("product:(Lexmark International Lexmark T (Hewlett-Packard Z)"))),
-            "(Lexmark T (HP Z)");
-  EXPECT_EQ(text(product(*S("product:(LEXMARK INTERNATIONAL E)"))), "(Lexmark E)");
-  EXPECT_EQ(text(product(*S("product:(Lexmark Lexmark C)"))), "(Lexmark C)");
-  // The parenthesised form needs its parenthesis.
-  EXPECT_EQ(text(product(*S("product:[HP HP 1]"))), "[HP HP 1]");
-  // Case folding reaches non-ASCII letters that fold to ASCII (Kelvin sign).
-  EXPECT_EQ(text(product(*S("product:(Hewlett-Pac\xE2\x84\xAA"
-                            "ard Jet)"))),
-            "(HP Jet)");
 }
 
 TEST(CleanUp, PlainFormRunsOnTheJoinedName) {
@@ -106,39 +92,41 @@ TEST(CleanUp, PlainFormRunsOnTheJoinedName) {
   EXPECT_EQ(wide, u"\u00e9 Lexmark z");
 }
 
-TEST(DeviceName, JoinsOrPrefersTheModelThenCleansUp) {
-  EXPECT_EQ(text(deviceName(*S("MFG:HP;MDL:LaserJet 4000;CMD:PJL,PCL,POSTSCRIPT;"))),
-            "HP LaserJet 4000");
-  EXPECT_EQ(text(deviceName(*S("MFG:Lexmark International;MDL:Lexmark T640"))), "Lexmark T640");
-  EXPECT_EQ(text(deviceName(*S("MFG:HP;MDL:HP LaserJet"))), "HP LaserJet");
-  EXPECT_EQ(text(deviceName(*S("MFG:hp;MDL:HP LaserJet"))), "HP LaserJet");
-  EXPECT_EQ(text(deviceName(*S("MFG: \tAcme \t;MDL:  Acme Jet  "))), "Acme Jet");
-  EXPECT_EQ(text(deviceName(*S("MFG:;MDL:Jet"))), " Jet") << "an empty make is never a prefix";
-}
-
-TEST(DeviceName, FallsBackOnModelMakeDescriptionThenUnknown) {
-  EXPECT_EQ(text(deviceName(*S("MDL: HP HP Solo "))), "HP HP Solo") << "no clean-up";
-  EXPECT_EQ(text(deviceName(*S("MFG:\tHewlett-Packard "))), "Hewlett-Packard");
-  EXPECT_EQ(text(deviceName(*S("DES:Office printer"))), "Office printer");
-  EXPECT_EQ(text(deviceName(*S("DESCRIPTION: Lobby "))), " Lobby ") << "not trimmed";
-  EXPECT_EQ(text(deviceName(*S("CMD:PCL"))), "Unknown");
-  EXPECT_EQ(text(deviceName(*S(""))), "Unknown");
-  EXPECT_EQ(text(deviceName(*S("MFG:\xC3\x89pson;MDL:\xC3\x89pson \xF0\x9F\x96\xA8"))),
-            "\xC3\x89pson \xF0\x9F\x96\xA8");
+TEST(DeviceName, JoinsOrPrefersTheModelThenCleansUpElseFallsBack) {
+  expectCases(
+      "deviceName", deviceName,
+      {
+          {"MFG:HP;MDL:LaserJet 4000;CMD:PJL,PCL,POSTSCRIPT;", "HP LaserJet 4000"},
+          {"product:(Hewlett-Packard LaserJet 4000)", "HP LaserJet 4000"},
+          {"product:(deskjet 990c)", "hp deskjet 990c"},
+          {"MFG:Lexmark International;MDL:Lexmark T640", "Lexmark T640"},
+          {"MFG:HP;MDL:HP LaserJet", "HP LaserJet"},
+          {"MFG:hp;MDL:HP LaserJet", "HP LaserJet"},
+          {"MFG: \tAcme \t;MDL:  Acme Jet  ", "Acme Jet"},
+          {"MFG:;MDL:Jet", " Jet"},  // an empty make is never a prefix
+          // Else the model, the make, the description, "Unknown".
+          {"MDL: HP HP Solo ", "HP HP Solo"},  // no clean-up
+          {"MFG:\tHewlett-Packard ", "Hewlett-Packard"},
+          {"DES:Office printer", "Office printer"},
+          {"DESCRIPTION: Lobby ", " Lobby "},  // not trimmed
+          {"CMD:PCL", "Unknown"},
+          {"", "Unknown"},
+          {"MFG:\xC3\x89pson;MDL:\xC3\x89pson \xF0\x9F\x96\xA8", "\xC3\x89pson \xF0\x9F\x96\xA8"},
+      });
 }
 
 TEST(SoftwareUpdateIdentifier, MakeAndModelWithTheRepeatedMakeDropped) {
-  EXPECT_EQ(text(softwareUpdateScaneID(*S("MFG:HP;MDL:LaserJet 4000;CMD:PJL,PCL,POSTSCRIPT;"))),
-            "MANUFACTURER:HP;MODEL:LaserJet 4000");
-  EXPECT_EQ(text(softwareUpdateScaneID(*S("MFG:HP;MDL:HP LaserJet"))),
-            "MANUFACTURER:HP;MODEL:LaserJet");
-  EXPECT_EQ(text(softwareUpdateScaneID(*S("MFG:hp;MDL:HP LaserJet"))),
-            "MANUFACTURER:hp;MODEL:HP LaserJet");
-  EXPECT_EQ(text(softwareUpdateScaneID(*S("MFG: HP ;MDL: HP  X "))), "MANUFACTURER:HP;MODEL: X");
-  EXPECT_EQ(text(softwareUpdateScaneID(*S("MFG:HP;MDL:HPX"))), "MANUFACTURER:HP;MODEL:HPX");
-  EXPECT_EQ(text(softwareUpdateScaneID(*S("MFG:Hewlett-Packard HP;MDL:X"))),
-            "MANUFACTURER:Hewlett-Packard HP;MODEL:X")
-      << "no clean-up";
-  EXPECT_EQ(text(softwareUpdateScaneID(*S("MFG:HP"))), nullopt);
-  EXPECT_EQ(text(softwareUpdateScaneID(*S(""))), nullopt);
+  expectCases("softwareUpdateScaneID", softwareUpdateScaneID,
+              {
+                  {"MFG:HP;MDL:LaserJet 4000;CMD:PJL,PCL,POSTSCRIPT;",
+                   "MANUFACTURER:HP;MODEL:LaserJet 4000"},
+                  {"MFG:HP;MDL:HP LaserJet", "MANUFACTURER:HP;MODEL:LaserJet"},
+                  {"MFG:hp;MDL:HP LaserJet", "MANUFACTURER:hp;MODEL:HP LaserJet"},
+                  {"MFG: HP ;MDL: HP  X ", "MANUFACTURER:HP;MODEL: X"},
+                  {"MFG:HP;MDL:HPX", "MANUFACTURER:HP;MODEL:HPX"},
+                  {"MFG:Hewlett-Packard HP;MDL:X", "MANUFACTURER:Hewlett-Packard HP;MODEL:X"},
+                  {"product:( )", "MANUFACTURER:;MODEL:"},
+                  {"MFG:HP", nullopt},
+                  {"", nullopt},
+              });
 }

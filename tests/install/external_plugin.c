@@ -50,7 +50,7 @@ static int32_t QueryInterface(void* self, QrUUIDBytes iid, void** out) {
 
 static const QrIUnknownVTbl kInstanceTable = {NULL, QueryInterface, AddRef, Release};
 
-void* ExternalFactory(void* allocator, QrUUIDRef typeID) {
+void* CreateInstance(void* allocator, QrUUIDRef typeID) {
   QrUUIDRef iom = QrUUIDCreateFromString(QR_IOM_TYPE_ID);
   bool wanted = QrEqual(typeID, iom);
   Instance* instance = NULL;

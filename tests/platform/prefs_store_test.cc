@@ -1,3 +1,5 @@
+#include "platform/prefs_store.h"
+
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <signal.h>
@@ -5,47 +7,54 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <chrono>
 #include <random>
 
+#include "fixtures/fixture_support.h"
 #include "platform/dictionary.h"
-#include "platform/log.h"
+#include "platform/file_io.h"
 #include "platform/number.h"
-#include "platform/prefs_store.h"
 #include "platform/property_list.h"
 #include "platform/string.h"
 #include "platform/url.h"
-#include "test_files.h"
+#include "support/temp_dir.h"
 
 using namespace qr;
-using qr::testing::EnvGuard;
-using qr::testing::TempDir;
 
 namespace {
 
 class PrefsStore : public ::testing::Test {
  protected:
-  void SetUp() override {
-    env_.set("CACHEWRIGHT_PREFS", store_);
-    previousSink_ = setLogSink([this](std::string_view line) { logged_.emplace_back(line); });
-  }
-  void TearDown() override { setLogSink(previousSink_); }
+  void SetUp() override { env_.set("CACHEWRIGHT_PREFS", store_); }
 
   Ref<Dictionary> storedDictionary() const {
     return cast<Dictionary>(readPropertyListFile(store_));
   }
-  size_t loggedLinesContaining(std::string_view text) const {
-    size_t n = 0;
-    for (const auto& line : logged_) n += line.find(text) != std::string::npos;
-    return n;
+  // What the store's directory holds, sorted.
+  std::vector<std::string> storeFolder() const {
+    std::vector<std::string> names;
+    for (const auto& entry : std::filesystem::directory_iterator(dir_ / "var/lib/quarrin"))
+      names.push_back(entry.path().filename().string());
+    std::sort(names.begin(), names.end());
+    return names;
+  }
+  static void set(std::string_view key, const Object& value) {
+    setPrintingPref(*String::make(key), value, 5);
   }
 
-  TempDir dir_{qr::testing::memoryBackedTempBase()};
+  qrtest::TempDir dir_{qrtest::memoryBackedTempBase()};
   std::string store_ = dir_ / "var/lib/quarrin/printing-prefs.plist";
-  EnvGuard env_;
-  LogSink previousSink_;
-  std::vector<std::string> logged_;
+  const std::vector<std::string> kStoreAndLock = {"printing-prefs.plist",
+                                                  "printing-prefs.plist.lock"};
+  qrtest::EnvGuard env_;
+  qr::test::CapturedLog log_;
 };
+
+size_t linesContaining(const qr::test::CapturedLog& log, std::string_view text) {
+  return std::ranges::count_if(
+      log.lines(), [&](const std::string& line) { return line.find(text) != std::string::npos; });
+}
 
 // Runs f in a child process; the child's exit status is f's result.
 template <class F>
@@ -64,25 +73,15 @@ int exitStatusOf(pid_t pid) {
   return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
 }
 
-std::vector<std::string> filesIn(const std::string& dir) {
-  std::vector<std::string> names;
-  for (const auto& entry : std::filesystem::directory_iterator(dir))
-    names.push_back(entry.path().filename().string());
-  std::sort(names.begin(), names.end());
-  return names;
-}
-
 }  // namespace
-
-TEST_F(PrefsStore, PathComesFromTheEnvironment) { EXPECT_EQ(prefsStorePath(), store_); }
 
 TEST_F(PrefsStore, MissingStoreHoldsNothingAndTheFirstWriteCreatesIt) {
   auto key = String::make("support_quarrin");
   EXPECT_FALSE(copyStringPrintingPref(*key, 5));
   EXPECT_FALSE(copyDictionaryPrintingPref(*key, 8));
-  EXPECT_TRUE(logged_.empty()) << "a missing store is no failure";
+  EXPECT_TRUE(log_.lines().empty()) << "a missing store is no failure";
 
-  setPrintingPref(*key, *String::make("YES"), 5);
+  set("support_quarrin", *String::make("YES"));
   auto value = copyStringPrintingPref(*key, 5);
   ASSERT_TRUE(value);
   EXPECT_EQ(value->utf8(), "YES");
@@ -92,11 +91,9 @@ TEST_F(PrefsStore, MissingStoreHoldsNothingAndTheFirstWriteCreatesIt) {
   EXPECT_EQ(st.st_mode & 0777, 0755u) << "missing directories are created";
   ASSERT_EQ(stat(store_.c_str(), &st), 0);
   EXPECT_EQ(st.st_mode & 0777, 0644u);
-  auto bytes = readFile(store_);
-  ASSERT_TRUE(bytes);
-  EXPECT_TRUE(bytes->starts_with("<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<plist"));
-  EXPECT_EQ(filesIn(dir_ / "var/lib/quarrin"),
-            (std::vector<std::string>{"printing-prefs.plist", "printing-prefs.plist.lock"}));
+  EXPECT_TRUE(
+      qrtest::readText(store_).starts_with("<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<plist"));
+  EXPECT_EQ(storeFolder(), kStoreAndLock);
 }
 
 TEST_F(PrefsStore, ValuesOfTheWrongKindReadAsNoneAndCopiesBelongToTheCaller) {
@@ -105,8 +102,8 @@ TEST_F(PrefsStore, ValuesOfTheWrongKindReadAsNoneAndCopiesBelongToTheCaller) {
   entry->set("Bundle Version", String::make("1.0"));
   auto cache = make<MutableDictionary>();
   cache->set("file:///a.plugin/", entry);
-  setPrintingPref(*cacheKey, *cache, 8);
-  setPrintingPref(*String::make("support_quarrin"), *String::make("YES"), 5);
+  set("pmcache 5", *cache);
+  set("support_quarrin", *String::make("YES"));
 
   auto copy = copyDictionaryPrintingPref(*cacheKey, 8);
   ASSERT_TRUE(copy);
@@ -122,8 +119,8 @@ TEST_F(PrefsStore, ValuesOfTheWrongKindReadAsNoneAndCopiesBelongToTheCaller) {
   EXPECT_FALSE(copyDictionaryPrintingPref(*String::make("support_quarrin"), 8));
 
   // A value that is no property list is refused with a log line; the store stays.
-  setPrintingPref(*String::make("url"), *URL::fileURL("/tmp", true), 5);
-  EXPECT_EQ(loggedLinesContaining("not a property list"), 1u);
+  set("url", *URL::fileURL("/tmp", true));
+  EXPECT_EQ(linesContaining(log_, "not a property list"), 1u);
   EXPECT_EQ(storedDictionary()->count(), 2u);
 }
 
@@ -160,48 +157,48 @@ TEST_F(PrefsStore, EveryReadSeesTheFileAsItIsAndAnUnchangedValueLeavesItAlone) {
 }
 
 TEST_F(PrefsStore, CorruptStoreReadsEmptyLogsOnceAndIsKeptBeforeReplacement) {
-  const std::string garbage = "<?xml version=\"1.0\"?><plist><dict><key>half";
-  std::filesystem::create_directories(dir_ / "var/lib/quarrin");
-  ASSERT_TRUE(writeFile(store_, garbage));
-  auto key = String::make("support_quarrin");
-  EXPECT_FALSE(copyStringPrintingPref(*key, 5));
-  EXPECT_FALSE(copyDictionaryPrintingPref(*key, 5));
-  EXPECT_EQ(loggedLinesContaining(store_), 1u) << "logged once, naming the store";
+  for (std::string corrupt : {
+           "<?xml version=\"1.0\"?><plist><dict><key>half",
+           // A whole property list, but no dictionary.
+           "<?xml version=\"1.0\"?>\n<plist version=\"1.0\"><array><string>support_quarrin</string>"
+           "</array></plist>\n",
+       }) {
+    SCOPED_TRACE(corrupt);
+    qr::test::CapturedLog log;
+    store_ += "-" + std::to_string(corrupt.size());  // a store not yet logged about
+    env_.set("CACHEWRIGHT_PREFS", store_);
+    qrtest::writeText(store_, corrupt);
+    auto key = String::make("support_quarrin");
+    EXPECT_FALSE(copyStringPrintingPref(*key, 5));
+    EXPECT_FALSE(copyDictionaryPrintingPref(*key, 5));
+    EXPECT_EQ(linesContaining(log, store_), 1u) << "logged once, naming the store";
 
-  setPrintingPref(*key, *String::make("YES"), 5);
-  EXPECT_EQ(readFile(store_ + ".corrupt"), garbage);
-  auto stored = storedDictionary();
-  ASSERT_TRUE(stored);
-  EXPECT_EQ(stored->count(), 1u);
-  EXPECT_EQ(copyStringPrintingPref(*key, 5)->utf8(), "YES");
-  EXPECT_EQ(loggedLinesContaining(".corrupt"), 1u);
-}
-
-TEST_F(PrefsStore, StoreWhoseTopLevelIsNoDictionaryCountsAsCorrupt) {
-  const std::string array =
-      "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<plist version=\"1.0\">\n"
-      "<array>\n\t<string>support_quarrin</string>\n</array>\n</plist>\n";
-  std::filesystem::create_directories(dir_ / "var/lib/quarrin");
-  ASSERT_TRUE(writeFile(store_, array));
-  auto key = String::make("support_quarrin");
-  EXPECT_FALSE(copyStringPrintingPref(*key, 5));
-  EXPECT_EQ(loggedLinesContaining(store_), 1u);
-  setPrintingPref(*String::make("other"), *String::make("x"), 5);
-  EXPECT_EQ(readFile(store_ + ".corrupt"), array);
-  EXPECT_EQ(storedDictionary()->count(), 1u);
+    set("support_quarrin", *String::make("YES"));
+    EXPECT_EQ(qrtest::readText(store_ + ".corrupt"), corrupt);
+    auto stored = storedDictionary();
+    ASSERT_TRUE(stored);
+    EXPECT_EQ(stored->count(), 1u);
+    EXPECT_EQ(copyStringPrintingPref(*key, 5)->utf8(), "YES");
+    EXPECT_EQ(linesContaining(log, ".corrupt"), 1u);
+  }
 }
 
 TEST_F(PrefsStore, UnreadableStoreIsNotReplaced) {
   // A directory where the store should be: reading fails, so writing must not
   // guess at what the store held.
   std::filesystem::create_directories(store_);
-  setPrintingPref(*String::make("k"), *String::make("v"), 5);
+  set("k", *String::make("v"));
   EXPECT_TRUE(std::filesystem::is_directory(store_));
-  EXPECT_GE(loggedLinesContaining(store_), 1u);
+  EXPECT_GE(linesContaining(log_, store_), 1u);
 }
 
 TEST_F(PrefsStore, ConcurrentWritersLoseNoKeyAndReadersAlwaysSeeAWholeStore) {
-  constexpr int kWriters = 8, kKeysEach = 200;
+  // Each writer sets its own few keys in turn, the value counting its writes,
+  // so the store stays small. Before every write it checks that each of its
+  // keys still holds the count it last wrote there: an update lost to another
+  // writer's stale copy would put an older count back or drop the key.
+  constexpr int kWriters = 8, kWritesEach = 200, kKeysEach = 4;
+  auto key = [](int w, int k) { return "w" + std::to_string(w) + "-" + std::to_string(k); };
   int done[2];
   ASSERT_EQ(pipe2(done, O_CLOEXEC), 0);
   pid_t reader = spawn([&] {
@@ -222,13 +219,20 @@ TEST_F(PrefsStore, ConcurrentWritersLoseNoKeyAndReadersAlwaysSeeAWholeStore) {
   });
   std::vector<pid_t> writers;
   for (int w = 0; w < kWriters; ++w)
-    writers.push_back(spawn([w] {
-      for (int k = 0; k < kKeysEach; ++k)
-        setPrintingPref(*String::make("w" + std::to_string(w) + "-" + std::to_string(k)),
-                        *Number::integer(w * 1000 + k), 5);
+    writers.push_back(spawn([&, w] {
+      std::vector<int64_t> last(kKeysEach, -1);
+      for (int n = 0; n < kWritesEach; ++n) {
+        auto stored = storedDictionary();
+        for (int k = 0; k < kKeysEach; ++k) {
+          auto* value = stored ? stored->getAs<Number>(key(w, k)) : nullptr;
+          if (last[k] >= 0 && (!value || value->int64Value() != last[k])) return false;
+        }
+        set(key(w, n % kKeysEach), *Number::integer(n));
+        last[n % kKeysEach] = n;
+      }
       return true;
     }));
-  for (pid_t pid : writers) EXPECT_EQ(exitStatusOf(pid), 0);
+  for (pid_t pid : writers) EXPECT_EQ(exitStatusOf(pid), 0) << "a writer saw its write lost";
   close(done[1]);
   EXPECT_EQ(exitStatusOf(reader), 0) << "a read saw a broken or shrunken store";
   close(done[0]);
@@ -238,17 +242,16 @@ TEST_F(PrefsStore, ConcurrentWritersLoseNoKeyAndReadersAlwaysSeeAWholeStore) {
   EXPECT_EQ(stored->count(), size_t(kWriters * kKeysEach));
   for (int w = 0; w < kWriters; ++w)
     for (int k = 0; k < kKeysEach; ++k) {
-      auto* n = stored->getAs<Number>("w" + std::to_string(w) + "-" + std::to_string(k));
-      ASSERT_TRUE(n) << w << "-" << k;
-      EXPECT_EQ(n->int64Value(), w * 1000 + k);
+      auto* n = stored->getAs<Number>(key(w, k));
+      ASSERT_TRUE(n) << key(w, k);
+      EXPECT_EQ(n->int64Value(), kWritesEach - kKeysEach + k) << key(w, k);
     }
-  EXPECT_TRUE(logged_.empty());
+  EXPECT_TRUE(log_.lines().empty());
 }
 
 TEST_F(PrefsStore, WriterKilledAtAnyMomentLeavesTheOldOrTheNewStore) {
   // The writer stores a counter with a payload whose size changes with it, so
   // a store written in place and cut short would fail to parse.
-  auto stateKey = String::make("state");
   auto stateFor = [](int64_t n) {
     auto state = make<MutableDictionary>();
     state->set("n", Number::integer(n));
@@ -261,8 +264,8 @@ TEST_F(PrefsStore, WriterKilledAtAnyMomentLeavesTheOldOrTheNewStore) {
     if (!n) return std::nullopt;
     return n->int64Value();
   };
-  setPrintingPref(*String::make("support_quarrin"), *String::make("YES"), 5);
-  setPrintingPref(*stateKey, *stateFor(0), 5);
+  set("support_quarrin", *String::make("YES"));
+  set("state", *stateFor(0));
   std::mt19937 random(12345);
   int64_t lastCounter = 0;
   int kills = 0, advanced = 0;
@@ -275,7 +278,7 @@ TEST_F(PrefsStore, WriterKilledAtAnyMomentLeavesTheOldOrTheNewStore) {
       for (;;) {
         auto n = counterIn(storedDictionary());
         if (!n) return false;
-        setPrintingPref(*stateKey, *stateFor(*n + 1), 5);
+        set("state", *stateFor(*n + 1));
       }
     });
     usleep(std::uniform_int_distribution<useconds_t>(0, 50000)(random));
@@ -295,7 +298,6 @@ TEST_F(PrefsStore, WriterKilledAtAnyMomentLeavesTheOldOrTheNewStore) {
   EXPECT_GE(advanced, 3) << "too few writers got a write through for the kills to mean much";
 
   // Temporary files of killed writers are cleared by the next writer.
-  setPrintingPref(*stateKey, *stateFor(lastCounter + 1), 5);
-  EXPECT_EQ(filesIn(dir_ / "var/lib/quarrin"),
-            (std::vector<std::string>{"printing-prefs.plist", "printing-prefs.plist.lock"}));
+  set("state", *stateFor(lastCounter + 1));
+  EXPECT_EQ(storeFolder(), kStoreAndLock);
 }

@@ -161,49 +161,20 @@ TEST(TextPropertyList, HonoursMutability) {
   EXPECT_TRUE(dynamic_cast<MutableString*>(table->get("k")));
 }
 
-TEST(TextPropertyList, RejectsMalformedText) {
-  for (std::string_view bad : {
-           "{ a = b; } trailing",
-           "(a) (b)",
-           "\"a\" = \"b\"",        // last pair without ';'
-           "\"a\" = \"b\"; junk",  // not a pair
-           "\"unterminated",
-           "\"escape at end\\",
-           "/* open comment",
-           "{ a = b; /* open }",
-           "{ a = b;",
-           "{ a b; }",
-           "{ a; }",  // the shorthand belongs to strings tables only
-           "{ a = ; }",
-           "{ (x) = y; }",
-           "{ <00> = y; }",
-           "{ {} = y; }",
-           "( , )",
-           "( a b )",
-           "( a,, )",
-           "( a",
-           "<0>",
-           "<0g>",
-           "<00",
-           "\"\\U\"",
-           "\"\\400\"",
-           "a = b; c",
-           "=",
-           ";",
-           "#",
-           "{ a = b; } }",
-       }) {
+TEST(TextPropertyList, RejectsMalformedTextAndBadEncodings) {
+  const std::string_view malformed[] = {
+      "{ a = b; } trailing", "(a) (b)", "\"unterminated", "\"escape at end\\", "/* open comment",
+      "{ a = b; /* open }", "{ a = b;", "{ a b; }", "{ a = ; }", "{ (x) = y; }", "{ <00> = y; }",
+      "{ {} = y; }", "( , )", "( a b )", "( a,, )", "( a", "<0>", "<0g>", "<00", "\"\\U\"",
+      "\"\\400\"", "a = b; c", "=", ";", "#", "{ a = b; } }",
+      // A last pair without ';', then no pair; the shorthand belongs to strings tables only.
+      "\"a\" = \"b\"", "\"a\" = \"b\"; junk", "{ a; }",
+      // Not UTF-8, overlong, an encoded surrogate, a truncated sequence.
+      "\"a\xFFz\"", "\"\xC0\xAF\"", "\"\xED\xA0\x80\"", "\"\xE2\x82\"",
+      std::string_view("\xFF\xFE\"\0a", 5),  // odd number of UTF-16 bytes
+      std::string_view("( a \0 )", 7)};      // NUL outside a string
+  for (std::string_view bad : malformed)
     for (auto m : kAllMutabilities) EXPECT_FALSE(read(bad, m)) << bad;
-  }
-}
-
-TEST(TextPropertyList, RejectsBadEncodings) {
-  EXPECT_FALSE(read("\"a\xFFz\""));                     // not UTF-8
-  EXPECT_FALSE(read("\"\xC0\xAF\""));                   // overlong
-  EXPECT_FALSE(read("\"\xED\xA0\x80\""));               // an encoded surrogate
-  EXPECT_FALSE(read("\"\xE2\x82\""));                   // truncated sequence
-  EXPECT_FALSE(read(std::string("\xFF\xFE\"\0a", 5)));  // odd number of UTF-16 bytes
-  EXPECT_FALSE(read(std::string("( a \0 )", 7)));       // NUL outside a string
 }
 
 TEST(TextPropertyList, NestingIsBoundedWithoutDeepRecursion) {

@@ -1,34 +1,17 @@
-// A temporary directory for one test, removed with everything in it.
+// Scratch directories, files and environment changes that tests undo when they end.
 #pragma once
 
-#include <cstdlib>
+#include <stdlib.h>
+#include <unistd.h>
+
 #include <filesystem>
 #include <fstream>
+#include <optional>
 #include <string>
 #include <string_view>
+#include <vector>
 
 namespace qrtest {
-
-class TempDir {
- public:
-  TempDir() {
-    std::string tmpl = (std::filesystem::temp_directory_path() / "quarrin-test-XXXXXX").string();
-    if (!mkdtemp(tmpl.data())) std::abort();
-    path_ = tmpl;
-  }
-  ~TempDir() {
-    std::error_code ec;
-    std::filesystem::remove_all(path_, ec);
-  }
-  TempDir(const TempDir&) = delete;
-  TempDir& operator=(const TempDir&) = delete;
-
-  const std::string& path() const { return path_; }
-  std::string operator/(std::string_view rel) const { return path_ + "/" + std::string(rel); }
-
- private:
-  std::string path_;
-};
 
 // Writes a file, creating its parent directories.
 inline void writeText(const std::string& path, std::string_view text) {
@@ -41,8 +24,71 @@ inline std::string readText(const std::string& path) {
   return std::string(std::istreambuf_iterator<char>(in), {});
 }
 
-// A minimal XML Info dictionary with the given short version (none when empty).
-inline std::string infoPlist(std::string_view identifier, std::string_view version) {
+// A temporary directory for one test, removed with everything in it.
+class TempDir {
+ public:
+  explicit TempDir(const std::filesystem::path& base = std::filesystem::temp_directory_path()) {
+    std::string pattern = (base / "quarrin-test-XXXXXX").string();
+    if (!::mkdtemp(pattern.data())) std::abort();
+    path_ = pattern;
+  }
+  ~TempDir() {
+    std::error_code ignored;
+    std::filesystem::remove_all(path_, ignored);
+  }
+  TempDir(const TempDir&) = delete;
+  TempDir& operator=(const TempDir&) = delete;
+
+  const std::string& path() const { return path_; }
+  std::string operator/(std::string_view relative) const {
+    return path_ + "/" + std::string(relative);
+  }
+  // Writes a file inside the directory and gives its full path.
+  std::string write(std::string_view relative, std::string_view bytes) const {
+    std::string full = *this / relative;
+    writeText(full, bytes);
+    return full;
+  }
+
+ private:
+  std::string path_;
+};
+
+// Memory-backed scratch space where there is some: tests that sync files
+// thousands of times run the same code there without waiting for a disk.
+inline std::filesystem::path memoryBackedTempBase() {
+  std::error_code error;
+  if (std::filesystem::is_directory("/dev/shm", error) && ::access("/dev/shm", W_OK) == 0)
+    return "/dev/shm";
+  return std::filesystem::temp_directory_path();
+}
+
+// Sets or unsets environment variables and restores them on destruction.
+class EnvGuard {
+ public:
+  ~EnvGuard() {
+    for (auto it = saved_.rbegin(); it != saved_.rend(); ++it) apply(it->first, it->second);
+  }
+  void set(const std::string& name, const std::optional<std::string>& value) {
+    const char* old = ::getenv(name.c_str());
+    saved_.emplace_back(name, old ? std::optional<std::string>(old) : std::nullopt);
+    apply(name, value);
+  }
+
+ private:
+  static void apply(const std::string& name, const std::optional<std::string>& value) {
+    if (value)
+      ::setenv(name.c_str(), value->c_str(), 1);
+    else
+      ::unsetenv(name.c_str());
+  }
+  std::vector<std::pair<std::string, std::optional<std::string>>> saved_;
+};
+
+// An XML Info dictionary with the given short version (none when empty) and
+// any further "<key>...</key><...>" lines.
+inline std::string infoPlist(std::string_view identifier, std::string_view version,
+                             std::string_view extra = {}) {
   std::string xml =
       "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<plist version=\"1.0\">\n<dict>\n"
       "\t<key>CFBundleIdentifier</key>\n\t<string>" +
@@ -50,7 +96,7 @@ inline std::string infoPlist(std::string_view identifier, std::string_view versi
   if (!version.empty())
     xml += "\t<key>CFBundleShortVersionString</key>\n\t<string>" + std::string(version) +
            "</string>\n";
-  return xml + "</dict>\n</plist>\n";
+  return xml + std::string(extra) + "</dict>\n</plist>\n";
 }
 
 }  // namespace qrtest
