@@ -7,6 +7,7 @@
 #include <cstdio>
 #include <thread>
 
+#include "platform/file_io.h"
 #include "platform/string.h"
 #include "support/temp_dir.h"
 

@@ -153,7 +153,7 @@ TEST_F(PrefsStore, EveryReadSeesTheFileAsItIsAndAnUnchangedValueLeavesItAlone) {
   ASSERT_EQ(stat(store_.c_str(), &after), 0);
   EXPECT_NE(after.st_ino, rewritten.st_ino);
   EXPECT_EQ(copyStringPrintingPref(*key, 5)->utf8(), "YES");
-  EXPECT_TRUE(logged_.empty());
+  EXPECT_TRUE(log_.lines().empty());
 }
 
 TEST_F(PrefsStore, CorruptStoreReadsEmptyLogsOnceAndIsKeptBeforeReplacement) {
