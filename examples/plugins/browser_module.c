@@ -1,6 +1,6 @@
 /* A sample printer browser module. A real one shows, in its client's pane,
  * the printers it finds on its connection type; this one has no pane and
- * finds nothing, but it answers its title, takes the lookup specs it is
+ * finds nothing, but it answers its title, takes the lookup dictionaries it is
  * given, and keeps its state as a browser would. Built with:
  *
  *   SAMPLE_TITLE  the title it gives in Prologue
@@ -34,11 +34,11 @@ static int32_t Initialize(uint32_t context, void* refCon, const PMPrBrowserCallb
   (void)userPane;
   if (context != kContext) return -50;
   lookupSpecCount = 0;
-  /* Take every lookup spec: these describe the printers worth showing. */
+  /* Take every lookup dictionary: these describe the printers worth showing. */
   for (uint32_t i = 0; callbacks && callbacks->getLookupSpec && i < numLookupSpecs; ++i) {
-    QrDictionaryRef spec = NULL;
-    if (callbacks->getLookupSpec(refCon, i, &spec) == 0 && spec) ++lookupSpecCount;
-    QrRelease(spec);
+    QrDictionaryRef lookup = NULL;
+    if (callbacks->getLookupSpec(refCon, i, &lookup) == 0 && lookup) ++lookupSpecCount;
+    QrRelease(lookup);
   }
   return 0;
 }
