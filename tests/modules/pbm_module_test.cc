@@ -162,13 +162,13 @@ TEST_F(PBMModules, TheLookupSpecFunctionReportsEveryFailureByItsStatus) {
   };
 
   ASSERT_EQ(lookup(module.get(), 0), 0);
-  Ref<Dictionary> lookup = adoptFromC<Dictionary>(result);
-  ASSERT_TRUE(lookup);
-  EXPECT_FALSE(cast<MutableDictionary>(lookup)) << "the plug-in gets an immutable copy";
-  EXPECT_NE(lookup.get(), list->getItemAtIndex(0)->lookupInfo());
-  EXPECT_TRUE(lookup->getAs<String>("connectionType")->equals("USB"));
-  EXPECT_EQ(lookup->get("PrBrowser Lookup Reference"), list->getItemAtIndex(0));
-  EXPECT_TRUE(lookup->getAs<String>("Printer Browser Kind")->equals("Fixture Laser 1"));
+  Ref<Dictionary> copied = adoptFromC<Dictionary>(result);
+  ASSERT_TRUE(copied);
+  EXPECT_FALSE(cast<MutableDictionary>(copied)) << "the plug-in gets an immutable copy";
+  EXPECT_NE(copied.get(), list->getItemAtIndex(0)->lookupInfo());
+  EXPECT_TRUE(copied->getAs<String>("connectionType")->equals("USB"));
+  EXPECT_EQ(copied->get("PrBrowser Lookup Reference"), list->getItemAtIndex(0));
+  EXPECT_TRUE(copied->getAs<String>("Printer Browser Kind")->equals("Fixture Laser 1"));
 
   EXPECT_EQ(lookup(module.get(), 2), kPBMBadIndex);
   EXPECT_FALSE(result);
