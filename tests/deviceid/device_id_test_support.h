@@ -41,11 +41,13 @@ struct Case {
   std::optional<std::string> expected;
 };
 
-// Applies the operation to each input, naming the operation and input on failure.
-template <class Op>
-void expectCases(std::string_view name, Op op, std::initializer_list<Case> cases) {
+// Applies the operation to each input (made into a value by `input`), naming
+// the operation and the input on failure.
+template <class Op, class Input = decltype(&S)>
+void expectCases(std::string_view name, Op op, std::initializer_list<Case> cases,
+                 Input input = &S) {
   for (const Case& c : cases)
-    EXPECT_EQ(text(op(*S(c.input))), c.expected) << name << " of \"" << c.input << "\"";
+    EXPECT_EQ(text(op(*input(c.input))), c.expected) << name << " of \"" << c.input << "\"";
 }
 
 }  // namespace deviceid_test

@@ -44,77 +44,75 @@ TEST(KeySearch, FieldsOfATypicalDeviceIDInNarrowAndWideStorage) {
   }
 }
 
-TEST(KeySearch, FirstComponentDecidesAndKeyOrderOnlyBreaksTiesWithinAComponent) {
-  EXPECT_EQ(text(model(*S("MODEL:A;MDL:B"))), "A");
-  EXPECT_EQ(text(make(*S("usb_MFG:U;MFG:M"))), "U");
-  // One component carrying two keys: the earlier key in the list wins.
+TEST(KeySearch, WhereKeysCountAndWhatTheyFind) {
+  // The first component decides; the earlier key in the list only breaks a tie
+  // within one. Keys count at the start or after blanks (any space separator,
+  // not a line break); a later occurrence in the same component is not looked
+  // for. Values are untrimmed, and empty is not nil.
+  expectCases("make", make,
+              {{"usb_MFG:U;MFG:M", "U"},
+               {"usb_MFG:Acme", "Acme"},
+               {" \t MFG:Tabbed ", "Tabbed "},
+               {"\xC2\xA0\xE3\x80\x80MFG:Wide", "Wide"},
+               {"\nMFG:X", nullopt},
+               {"xMFG:X;MFG:Y", "Y"},
+               {"AMFG:MFG:X", nullopt},
+               {"MFG:;MDL:X;product:(Other Thing)", ""},
+               {"MDL:X", nullopt}});
+  expectCases("model", model,
+              {{"MODEL:A;MDL:B", "A"},
+               {"MFG:HP; MDL: LaserJet", " LaserJet"},
+               {"MDL:\xF0\x9F\x96\xA8 Printer", "\xF0\x9F\x96\xA8 Printer"}});
+  expectCases("commandSet", commandSet, {{"usb_CMD:PCL", "PCL"}, {"", nullopt}});
+  // The misspelt key is the one searched for.
+  expectCases("compatibleIDs", compatibleIDs,
+              {{"COMPATIBLITY ID:x", "x"},
+               {"COMPATIBILITY ID:x", nullopt},
+               {"usb_COMPATIBLITY ID:y", "y"}});
+  // Long s folds to s and the Kelvin sign to k; sharp s does not match "ss".
+  expectCases("serialNumber", serialNumber, {{"\xC5\xBFN:long-s", "long-s"}});
+  struct {
+    std::string_view text, key;
+    std::optional<std::string> expected;
+  } byKey[] = {{"MDL:first;MDL:second", "mdl:", "first"},
+               {"usb_CMD:PCL", "CMD:", nullopt},
+               {"usb_SN:123", "SN:", nullopt},
+               {"MFG:X", "", nullopt},
+               {";;", ";", nullopt},
+               {"MFG:HP", "MFG", ":HP"},  // a key without its colon gives the colon back
+               {"\xE2\x84\xAA"
+                "ey:v",
+                "key:", "v"},
+               {"STRASSE:1",
+                "stra\xC3\x9F"
+                "e:",
+                nullopt},
+               {"stra\xC3\x9F"
+                "e:1",
+                "STRASSE:", nullopt},
+               {"STRA\xE1\xBA\x9E"
+                "E:2",
+                "stra\xC3\x9F"
+                "e:",
+                "2"},
+               {"\xC3\x89TAT:pr\xC3\xAAt", "\xC3\xA9tat:", "pr\xC3\xAAt"},
+               {"\xF0\x90\x90\x80:deseret", "\xF0\x90\x90\xA8:", "deseret"},
+               // Keys with blanks at their ends match only at the very start of a component.
+               {" MFG:A", " MFG:", "A"},
+               {"  MFG:A", " MFG:", nullopt},
+               {"MFG: A", "MFG: ", "A"},
+               {" MFG: A", "MFG: ", nullopt}};
+  for (const auto& c : byKey)
+    EXPECT_EQ(text(stringForKey(*S(c.text), *S(c.key))), c.expected) << c.text << " / " << c.key;
+
   EXPECT_EQ(text(searchStringFor(*S("XMFG:1"), *keys({"XMFG:", "MFG:"}))), "1");
   EXPECT_EQ(text(searchStringFor(*S("a:1;b:2"), *keys({"b:", "a:"}))), "1");
-  EXPECT_EQ(text(stringForKey(*S("MDL:first;MDL:second"), *S("mdl:"))), "first");
-}
-
-TEST(KeySearch, KeysCountOnlyAtTheStartOrAfterSpacesAndTabs) {
-  EXPECT_EQ(text(commandSet(*S("usb_CMD:PCL"))), "PCL") << "through usb_CMD:, not CMD:";
-  EXPECT_EQ(text(stringForKey(*S("usb_CMD:PCL"), *S("CMD:"))), nullopt);
-  EXPECT_EQ(text(stringForKey(*S("usb_SN:123"), *S("SN:"))), nullopt);
-  EXPECT_EQ(text(make(*S("usb_MFG:Acme"))), "Acme");
-  EXPECT_EQ(text(model(*S("MFG:HP; MDL: LaserJet"))), " LaserJet") << "value untrimmed";
-  EXPECT_EQ(text(make(*S(" \t MFG:Tabbed "))), "Tabbed ");
-  // Any space separator counts as a blank; a line break does not.
-  EXPECT_EQ(text(make(*S("\xC2\xA0\xE3\x80\x80MFG:Wide"))), "Wide");  // NBSP, ideographic space
-  EXPECT_EQ(text(make(*S("\nMFG:X"))), nullopt);
-  EXPECT_EQ(text(make(*S("xMFG:X;MFG:Y"))), "Y");
-  // A later occurrence in the same component is not looked for.
-  EXPECT_EQ(text(make(*S("AMFG:MFG:X"))), nullopt);
-}
-
-TEST(KeySearch, NilIsDistinctFromEmpty) {
-  EXPECT_EQ(text(make(*S("MFG:;MDL:X;product:(Other Thing)"))), "");
-  EXPECT_EQ(text(make(*S("MDL:X"))), nullopt);
-  EXPECT_EQ(text(commandSet(*S(""))), nullopt);
   EXPECT_EQ(text(searchStringFor(*S("MFG:X"), *keys({}))), nullopt);
-  EXPECT_EQ(text(stringForKey(*S("MFG:X"), *S(""))), nullopt) << "an empty key is never found";
-  EXPECT_EQ(text(stringForKey(*S(";;"), *S(";"))), nullopt);
   // Non-string keys are passed over.
   auto mixed = qr::make<qr::MutableArray>();
   mixed->append(qr::make<qr::MutableArray>());
   mixed->append(S("MDL:"));
   EXPECT_EQ(text(searchStringFor(*S("MDL:Q"), *mixed)), "Q");
-}
-
-TEST(KeySearch, AKeyWithoutItsColonGivesTheColonBack) {
-  EXPECT_EQ(text(stringForKey(*S("MFG:HP"), *S("MFG"))), ":HP");
-}
-
-TEST(KeySearch, CompatibleIDKeysKeepTheirSpelling) {
-  EXPECT_EQ(text(compatibleIDs(*S("COMPATIBLITY ID:x"))), "x");
-  EXPECT_EQ(text(compatibleIDs(*S("COMPATIBILITY ID:x"))), nullopt);
-  EXPECT_EQ(text(compatibleIDs(*S("usb_COMPATIBLITY ID:y"))), "y");
-}
-
-TEST(KeySearch, LetterCaseFoldsOneCodePointToOneCodePoint) {
-  // Long s folds to s; Kelvin sign folds to k; sharp s does not match "ss".
-  EXPECT_EQ(text(serialNumber(*S("\xC5\xBFN:long-s"))), "long-s");
-  EXPECT_EQ(text(stringForKey(*S("\xE2\x84\xAA"
-                                 "ey:v"),
-                              *S("key:"))),
-            "v");
-  EXPECT_EQ(text(stringForKey(*S("STRASSE:1"), *S("stra\xC3\x9F"
-                                                  "e:"))),
-            nullopt);
-  EXPECT_EQ(text(stringForKey(*S("stra\xC3\x9F"
-                                 "e:1"),
-                              *S("STRASSE:"))),
-            nullopt);
-  EXPECT_EQ(text(stringForKey(*S("STRA\xE1\xBA\x9E"
-                                 "E:2"),
-                              *S("stra\xC3\x9F"
-                                 "e:"))),
-            "2");
-  // Non-ASCII keys and values, and letters outside the basic plane.
-  EXPECT_EQ(text(stringForKey(*S("\xC3\x89TAT:pr\xC3\xAAt"), *S("\xC3\xA9tat:"))), "pr\xC3\xAAt");
-  EXPECT_EQ(text(stringForKey(*S("\xF0\x90\x90\x80:deseret"), *S("\xF0\x90\x90\xA8:"))), "deseret");
-  EXPECT_EQ(text(model(*S("MDL:\xF0\x9F\x96\xA8 Printer"))), "\xF0\x9F\x96\xA8 Printer");
 }
 
 TEST(KeySearch, TheShortcutAgreesWithTheLiteralRule) {
@@ -144,11 +142,6 @@ TEST(KeySearch, TheShortcutAgreesWithTheLiteralRule) {
       }
     }
   }
-  // Keys with blanks at their ends match only at the very start of a component.
-  EXPECT_EQ(text(stringForKey(*S(" MFG:A"), *S(" MFG:"))), "A");
-  EXPECT_EQ(text(stringForKey(*S("  MFG:A"), *S(" MFG:"))), nullopt);
-  EXPECT_EQ(text(stringForKey(*S("MFG: A"), *S("MFG: "))), "A");
-  EXPECT_EQ(text(stringForKey(*S(" MFG: A"), *S("MFG: "))), nullopt);
 }
 
 TEST(KeySearch, KeyNamesComeInBothFormsInTheirFixedOrder) {
