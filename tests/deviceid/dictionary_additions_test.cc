@@ -15,13 +15,13 @@ using std::nullopt;
 namespace {
 
 // A dictionary of strings from "KEY=value|KEY=value", in that order.
-qr::Ref<qr::MutableDictionary> dict(std::string_view spec) {
+qr::Ref<qr::MutableDictionary> dict(std::string_view entries) {
   auto d = qr::make<qr::MutableDictionary>();
-  while (!spec.empty()) {
-    std::string_view entry = spec.substr(0, spec.find('|'));
+  while (!entries.empty()) {
+    std::string_view entry = entries.substr(0, entries.find('|'));
     size_t equals = entry.find('=');
     d->set(entry.substr(0, equals), S(entry.substr(equals + 1)));
-    spec.remove_prefix(std::min(spec.size(), entry.size() + 1));
+    entries.remove_prefix(std::min(entries.size(), entry.size() + 1));
   }
   return d;
 }
@@ -127,7 +127,7 @@ TEST(DictionaryAccessors, ValuesThatAreNotPlainStrings) {
 TEST(DictionaryAccessors, CapabilityTests) {
   // The dictionary value may hold ";": each part is an item of its own.
   struct {
-    const char* spec;
+    const char* entries;
     bool pcl, postscript;
   } cases[] = {{"pdl=application/postscript,application/pdf", false, true},
                {"CMD=PCL;PS", true, true},
@@ -135,7 +135,7 @@ TEST(DictionaryAccessors, CapabilityTests) {
                {"CMD=pcl6", true, false},
                {"", false, true}};
   for (const auto& c : cases) {
-    EXPECT_EQ(supportsPCL(*dict(c.spec)), c.pcl) << c.spec;
-    EXPECT_EQ(supportsPostscript(*dict(c.spec)), c.postscript) << c.spec;
+    EXPECT_EQ(supportsPCL(*dict(c.entries)), c.pcl) << c.entries;
+    EXPECT_EQ(supportsPostscript(*dict(c.entries)), c.postscript) << c.entries;
   }
 }
