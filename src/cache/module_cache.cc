@@ -41,11 +41,14 @@ QuarrinModuleCache& QuarrinModuleCache::defaultCache() {
 
 MutableDictionary& QuarrinModuleCache::cacheDict() {
   if (cacheDict_) return *cacheDict_;
-  Ref<Object> source = copyDictionaryPrintingPref(*String::make(kCachePrefKey), kCachePrefDomain);
-  if (!source) source = loadDefaultCacheResource();
-  Ref<MutableDictionary> loaded;
-  if (source)
-    loaded = cast<MutableDictionary>(deepCopy(*source, Mutability::MutableContainersAndLeaves));
+  // The store hands out a fresh copy, mutable down to its leaves: it is the
+  // cache's own already. Only the read-only default resource is copied.
+  Ref<MutableDictionary> loaded =
+      copyDictionaryPrintingPref(*String::make(kCachePrefKey), kCachePrefDomain);
+  if (!loaded) {
+    if (Ref<Object> source = loadDefaultCacheResource())
+      loaded = cast<MutableDictionary>(deepCopy(*source, Mutability::MutableContainersAndLeaves));
+  }
   if (!loaded) {
     log("Could not load internal printer module cache.");
     loaded = make<MutableDictionary>();

@@ -265,7 +265,7 @@ Ref<String> copyStringPrintingPref(const String& key, int /*domain*/) {
 Ref<MutableDictionary> copyDictionaryPrintingPref(const String& key, int /*domain*/) {
   Ref<Dictionary> value = cast<Dictionary>(readPreference(key));
   if (!value) return nullptr;
-  return cast<MutableDictionary>(deepCopy(*value, Mutability::MutableContainers));
+  return cast<MutableDictionary>(deepCopy(*value, Mutability::MutableContainersAndLeaves));
 }
 
 void setPrintingPref(const String& key, const Object& value, int /*domain*/) {

@@ -18,7 +18,8 @@ std::string prefsStorePath();
 
 // A new string the caller owns, or null when the key holds no string.
 Ref<String> copyStringPrintingPref(const String& key, int domain);
-// A new mutable dictionary the caller owns, or null when the key holds no dictionary.
+// A new dictionary, mutable down to its leaves, that the caller owns; null when
+// the key holds no dictionary.
 Ref<MutableDictionary> copyDictionaryPrintingPref(const String& key, int domain);
 // Stores a property-list value under the key; failures are logged.
 void setPrintingPref(const String& key, const Object& value, int domain);
