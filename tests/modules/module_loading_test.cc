@@ -15,10 +15,9 @@ using namespace qr;
 using qr::test::CapturedLog;
 using qr::test::fixtureBundle;
 using qr::test::FixtureCalls;
+using qr::test::fixtureURL;
 
 namespace {
-
-Ref<URL> fixtureURL(std::string_view name) { return URL::fileURL(fixtureBundle(name), true); }
 
 size_t countContaining(const std::vector<std::string>& lines, std::string_view text) {
   size_t n = 0;

@@ -15,10 +15,9 @@ using namespace qr;
 using qr::test::CapturedLog;
 using qr::test::fixtureBundle;
 using qr::test::FixtureCalls;
+using qr::test::fixtureURL;
 
 namespace {
-
-Ref<URL> fixtureURL(std::string_view name) { return URL::fileURL(fixtureBundle(name), true); }
 
 template <class P>
 std::string text(P* pointer) {
