@@ -11,9 +11,9 @@
 #include <string>
 #include <vector>
 
-#include "platform/bundle.h"
+#include "bundles/bundle.h"
 #include "platform/file_io.h"
-#include "platform/property_list.h"
+#include "plist/property_list.h"
 
 namespace {
 

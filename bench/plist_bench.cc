@@ -19,11 +19,11 @@
 #include <string>
 #include <vector>
 
-#include "platform/array.h"
-#include "platform/dictionary.h"
 #include "platform/file_io.h"
-#include "platform/property_list.h"
-#include "platform/string.h"
+#include "plist/property_list.h"
+#include "values/array.h"
+#include "values/dictionary.h"
+#include "values/string.h"
 
 #ifdef QUARRIN_HAVE_LIBPLIST
 #include <plist/plist.h>

@@ -6,8 +6,8 @@
 #include <string>
 #include <vector>
 
-#include "platform/deep_copy.h"
-#include "platform/property_list.h"
+#include "plist/property_list.h"
+#include "values/deep_copy.h"
 
 namespace {
 

@@ -30,9 +30,9 @@
 #include <string>
 #include <vector>
 
-#include "platform/dictionary.h"
 #include "platform/file_io.h"
-#include "platform/property_list.h"
+#include "plist/property_list.h"
+#include "values/dictionary.h"
 
 #if !defined(QUARRIN_CACHEWRIGHT) || !defined(QUARRIN_SAMPLE_PRINTER_MODULE) || \
     !defined(QUARRIN_SAMPLE_IO_MODULES)

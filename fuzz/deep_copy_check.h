@@ -6,8 +6,8 @@
 #include <cstdlib>
 #include <string_view>
 
-#include "platform/deep_copy.h"
-#include "platform/object.h"
+#include "values/deep_copy.h"
+#include "values/object.h"
 
 template <class Reader>
 void checkDeepCopies(const uint8_t* data, size_t size, Reader read) {

@@ -10,9 +10,9 @@
 #include "deviceid/key_search.h"
 #include "deviceid/percent_escape.h"
 #include "deviceid/string_additions.h"
-#include "platform/array.h"
-#include "platform/dictionary.h"
-#include "platform/string.h"
+#include "values/array.h"
+#include "values/dictionary.h"
+#include "values/string.h"
 
 using namespace PMStringAdditions;
 using qr::Ref;

@@ -7,8 +7,8 @@
 #include <string>
 #include <string_view>
 
+#include "images/image.h"
 #include "platform/file_io.h"
-#include "platform/image.h"
 
 namespace {
 

@@ -9,11 +9,11 @@
 #include <string>
 #include <string_view>
 
-#include "platform/dictionary.h"
+#include "bundles/plugin_model.h"
 #include "platform/file_io.h"
 #include "platform/log.h"
-#include "platform/plugin_model.h"
-#include "platform/string.h"
+#include "values/dictionary.h"
+#include "values/string.h"
 
 namespace {
 

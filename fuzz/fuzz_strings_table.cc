@@ -8,9 +8,9 @@
 #include <string>
 #include <string_view>
 
-#include "platform/bundle.h"
+#include "bundles/bundle.h"
 #include "platform/file_io.h"
-#include "platform/string.h"
+#include "values/string.h"
 
 namespace {
 

@@ -5,7 +5,7 @@
 #include <string_view>
 
 #include "../tests/support/plist_identity.h"
-#include "platform/property_list.h"
+#include "plist/property_list.h"
 
 using namespace qr;
 

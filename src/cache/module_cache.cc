@@ -1,12 +1,12 @@
 #include "cache/module_cache.h"
 
-#include "platform/bundle.h"
-#include "platform/deep_copy.h"
+#include "bundles/bundle.h"
 #include "platform/file_io.h"
 #include "platform/locations.h"
 #include "platform/log.h"
-#include "platform/prefs_store.h"
-#include "platform/property_list.h"
+#include "plist/property_list.h"
+#include "store/prefs_store.h"
+#include "values/deep_copy.h"
 
 namespace qr {
 namespace {

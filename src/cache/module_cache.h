@@ -8,11 +8,11 @@
 //                       "kIOMConnectionType": "...", "kIOMBrowserPath": "..." }  I/O modules
 #pragma once
 
-#include "platform/array.h"
-#include "platform/dictionary.h"
-#include "platform/object.h"
-#include "platform/string.h"
-#include "platform/url.h"
+#include "values/array.h"
+#include "values/dictionary.h"
+#include "values/object.h"
+#include "values/string.h"
+#include "values/url.h"
 
 namespace qr {
 

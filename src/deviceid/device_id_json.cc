@@ -5,12 +5,12 @@
 
 #include "deviceid/dictionary_additions.h"
 #include "deviceid/string_additions.h"
-#include "platform/array.h"
-#include "platform/boolean.h"
-#include "platform/data.h"
-#include "platform/date.h"
-#include "platform/deep_copy.h"
-#include "platform/number.h"
+#include "values/array.h"
+#include "values/boolean.h"
+#include "values/data.h"
+#include "values/date.h"
+#include "values/deep_copy.h"
+#include "values/number.h"
 
 namespace qr::deviceid {
 namespace {

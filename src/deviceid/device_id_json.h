@@ -4,8 +4,8 @@
 
 #include <string>
 
-#include "platform/dictionary.h"
-#include "platform/string.h"
+#include "values/dictionary.h"
+#include "values/string.h"
 
 namespace qr::deviceid {
 

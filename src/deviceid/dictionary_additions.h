@@ -6,8 +6,8 @@
 // and any other value's description.
 #pragma once
 
-#include "platform/dictionary.h"
-#include "platform/string.h"
+#include "values/dictionary.h"
+#include "values/string.h"
 
 namespace PMDictionaryAdditions {
 

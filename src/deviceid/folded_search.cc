@@ -1,6 +1,6 @@
 #include "deviceid/folded_search.h"
 
-#include "platform/string.h"
+#include "values/string.h"
 
 namespace qr::deviceid {
 

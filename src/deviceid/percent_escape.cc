@@ -5,7 +5,7 @@
 #include <memory>
 #include <string_view>
 
-#include "platform/string.h"
+#include "values/string.h"
 
 namespace qr {
 namespace {

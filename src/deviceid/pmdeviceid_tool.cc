@@ -8,10 +8,10 @@
 
 #include "deviceid/device_id_json.h"
 #include "deviceid/percent_escape.h"
-#include "platform/dictionary.h"
 #include "platform/file_io.h"
-#include "platform/property_list.h"
-#include "platform/string.h"
+#include "plist/property_list.h"
+#include "values/dictionary.h"
+#include "values/string.h"
 
 namespace qr::deviceid {
 namespace {

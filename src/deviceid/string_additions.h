@@ -7,9 +7,9 @@
 #pragma once
 
 #include "deviceid/text_encoding.h"
-#include "platform/array.h"
-#include "platform/dictionary.h"
-#include "platform/string.h"
+#include "values/array.h"
+#include "values/dictionary.h"
+#include "values/string.h"
 
 namespace PMStringAdditions {
 

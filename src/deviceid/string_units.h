@@ -5,7 +5,7 @@
 #include <optional>
 
 #include "deviceid/unicode_text.h"
-#include "platform/string.h"
+#include "values/string.h"
 
 namespace qr::deviceid {
 

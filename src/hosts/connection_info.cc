@@ -3,10 +3,10 @@
 #include <unicode/uchar.h>
 #include <unicode/ustring.h>
 
+#include "bundles/bundle.h"
+#include "bundles/c_bridge.h"
 #include "modules/module_factory.h"
 #include "modules/pbm_module.h"
-#include "platform/bundle.h"
-#include "platform/c_bridge.h"
 #include "platform/file_io.h"
 
 namespace qr {

@@ -3,9 +3,9 @@
 // module's bundle identifier and display title derived on first request.
 #pragma once
 
-#include "platform/object.h"
-#include "platform/string.h"
-#include "platform/url.h"
+#include "values/object.h"
+#include "values/string.h"
+#include "values/url.h"
 
 namespace qr {
 

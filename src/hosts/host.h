@@ -3,9 +3,9 @@
 // one location is one entry however the caller spelled its URL.
 #pragma once
 
-#include "platform/dictionary.h"
-#include "platform/object.h"
-#include "platform/url.h"
+#include "values/dictionary.h"
+#include "values/object.h"
+#include "values/url.h"
 
 namespace qr {
 

@@ -5,7 +5,7 @@
 #include "hosts/connection_info.h"
 #include "hosts/host.h"
 #include "modules/io_module.h"
-#include "platform/array.h"
+#include "values/array.h"
 
 namespace qr {
 

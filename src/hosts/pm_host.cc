@@ -1,6 +1,6 @@
 #include "hosts/pm_host.h"
 
-#include "platform/deep_copy.h"
+#include "values/deep_copy.h"
 
 namespace qr {
 

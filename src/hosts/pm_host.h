@@ -3,12 +3,12 @@
 #pragma once
 
 #include "hosts/host.h"
-#include "hosts/lookup_info.h"
+#include "modules/lookup_source.h"
 #include "modules/pm_module.h"
 
 namespace qr {
 
-class PMHost final : public QuarrinHost {
+class PMHost final : public QuarrinHost, public LookupListSource {
  public:
   PMHost() : _lookupLists(make<MutableArray>()) {}
 
@@ -16,7 +16,7 @@ class PMHost final : public QuarrinHost {
   void setLookupLists(Ref<MutableArray> lists) { _lookupLists = std::move(lists); }
   // The list for the connection type, never null. A list that already holds
   // items is returned as it is; an empty one asks every module again.
-  LookupInfoList* GetLookupInfoList(const String& connectionType);
+  LookupInfoList* GetLookupInfoList(const String& connectionType) override;
   // The module registered under exactly that URL (a registry key), or null.
   PMModule* pmInterfaceForURL(const URL* url) const;
 

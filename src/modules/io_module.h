@@ -4,7 +4,7 @@
 #pragma once
 
 #include "modules/module.h"
-#include "platform/string.h"
+#include "values/string.h"
 
 namespace qr {
 

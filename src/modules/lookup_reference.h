@@ -3,8 +3,8 @@
 // are such objects; the icon lookup follows the reference to them.
 #pragma once
 
-#include "platform/dictionary.h"
-#include "platform/object.h"
+#include "values/dictionary.h"
+#include "values/object.h"
 
 namespace qr {
 

@@ -2,11 +2,11 @@
 // factory, and the interface obtained from it at most once.
 #pragma once
 
-#include "platform/array.h"
-#include "platform/object.h"
-#include "platform/plugin_model.h"
-#include "platform/url.h"
-#include "platform/uuid.h"
+#include "bundles/plugin_model.h"
+#include "values/array.h"
+#include "values/object.h"
+#include "values/url.h"
+#include "values/uuid.h"
 
 namespace qr {
 

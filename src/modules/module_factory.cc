@@ -2,13 +2,13 @@
 
 #include <quarrin/plugin.h>
 
+#include "bundles/plugin_model.h"
 #include "modules/io_module.h"
 #include "modules/module.h"
 #include "modules/pbm_module.h"
 #include "modules/plugin_guard.h"
 #include "modules/pm_module.h"
 #include "platform/log.h"
-#include "platform/plugin_model.h"
 
 namespace qr {
 namespace {

@@ -6,9 +6,9 @@
 
 #include <cstdint>
 
-#include "platform/object.h"
-#include "platform/url.h"
-#include "platform/uuid.h"
+#include "values/object.h"
+#include "values/url.h"
+#include "values/uuid.h"
 
 namespace qr {
 

@@ -2,10 +2,9 @@
 
 #include <cstdlib>
 
-#include "hosts/pm_host.h"
+#include "bundles/c_bridge.h"
 #include "modules/module_factory.h"
 #include "modules/plugin_guard.h"
-#include "platform/c_bridge.h"
 #include "platform/log.h"
 
 namespace qr {
@@ -25,8 +24,8 @@ int32_t PBMModule::callEntry(const char* name, Call&& call) {
   return status;
 }
 
-int32_t PBMModule::loadPluginInterface(const String* connectionType, PMHost* pmHost, void* refCon,
-                                       uint32_t browserFlags,
+int32_t PBMModule::loadPluginInterface(const String* connectionType, LookupListSource* pmHost,
+                                       void* refCon, uint32_t browserFlags,
                                        PMPrBrowserGetLookupSpecProc getLookupSpec,
                                        PMPrBrowserSyncRequestProc syncRequest,
                                        PMPrBrowserSelStatusProc selStatus, void* userPane,

@@ -9,13 +9,12 @@
 
 #include <cstdint>
 
+#include "modules/lookup_source.h"
 #include "modules/module.h"
-#include "platform/array.h"
-#include "platform/string.h"
+#include "values/array.h"
+#include "values/string.h"
 
 namespace qr {
-
-class PMHost;
 
 // Status values of the browser operations.
 enum : int32_t {
@@ -41,7 +40,7 @@ class PBMModule final : public QuarrinModule {
 
   // Opens the browser: flags 16 asks only for the title; anything else is a
   // full open that needs a non-empty lookup list from the host.
-  int32_t loadPluginInterface(const String* connectionType, PMHost* pmHost, void* refCon,
+  int32_t loadPluginInterface(const String* connectionType, LookupListSource* pmHost, void* refCon,
                               uint32_t browserFlags, PMPrBrowserGetLookupSpecProc getLookupSpec,
                               PMPrBrowserSyncRequestProc syncRequest,
                               PMPrBrowserSelStatusProc selStatus, void* userPane,
@@ -60,7 +59,7 @@ class PBMModule final : public QuarrinModule {
   const Ref<String>& connectionType() const noexcept { return _connectionType; }
   void setConnectionType(Ref<String> type) { _connectionType = std::move(type); }
   void* refCon() const noexcept { return _refcon; }
-  PMHost* pmHost() const noexcept { return _pmHost; }
+  LookupListSource* pmHost() const noexcept { return _pmHost; }
   const PMPrBrowserCallbacks* browserCallbacks() const noexcept { return _browserCallbacks; }
 
   // The host's lookup function: refCon is the module given to Initialize.
@@ -79,7 +78,7 @@ class PBMModule final : public QuarrinModule {
   PMPrBrowserCallbacks* _browserCallbacks = nullptr;
   uint32_t _browserContext = 0;
   void* _refcon = nullptr;
-  PMHost* _pmHost = nullptr;
+  LookupListSource* _pmHost = nullptr;
 };
 
 }  // namespace qr

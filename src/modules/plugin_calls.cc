@@ -5,7 +5,7 @@
 #include <cstring>
 #include <utility>
 
-#include "platform/c_bridge.h"
+#include "bundles/c_bridge.h"
 
 namespace qr::plugin_calls {
 namespace {

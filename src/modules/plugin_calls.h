@@ -5,9 +5,9 @@
 
 #include <cstdint>
 
-#include "platform/array.h"
-#include "platform/string.h"
-#include "platform/uuid.h"
+#include "values/array.h"
+#include "values/string.h"
+#include "values/uuid.h"
 
 namespace qr::plugin_calls {
 

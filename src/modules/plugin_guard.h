@@ -7,7 +7,7 @@
 #include <optional>
 #include <string>
 
-#include "platform/exception.h"
+#include "values/exception.h"
 
 namespace qr {
 

@@ -1,14 +1,14 @@
 #include "modules/pm_module.h"
 
 #include "cache/module_cache.h"
+#include "images/image.h"
 #include "modules/lookup_reference.h"
 #include "modules/module_factory.h"
 #include "modules/plugin_calls.h"
 #include "modules/plugin_guard.h"
-#include "platform/deep_copy.h"
 #include "platform/file_io.h"
-#include "platform/image.h"
 #include "platform/log.h"
+#include "values/deep_copy.h"
 
 namespace qr {
 namespace {

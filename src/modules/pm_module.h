@@ -5,10 +5,10 @@
 #pragma once
 
 #include "modules/module.h"
-#include "platform/array.h"
-#include "platform/data.h"
-#include "platform/dictionary.h"
-#include "platform/string.h"
+#include "values/array.h"
+#include "values/data.h"
+#include "values/dictionary.h"
+#include "values/string.h"
 
 namespace qr {
 

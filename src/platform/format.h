@@ -9,7 +9,7 @@
 #include <type_traits>
 #include <vector>
 
-#include "platform/object.h"
+#include "values/object.h"
 
 namespace qr {
 

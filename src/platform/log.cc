@@ -8,7 +8,7 @@
 #include <cstdio>
 #include <mutex>
 
-#include "platform/object.h"
+#include "values/object.h"
 
 namespace qr {
 namespace {
@@ -21,14 +21,6 @@ LogSink& currentSink() {
   return sink;
 }
 }  // namespace
-
-std::string Object::description() const {
-  char buf[48];
-  std::snprintf(buf, sizeof buf, "<Object %p>", static_cast<const void*>(this));
-  return buf;
-}
-
-std::string describe(const Object* o) { return o ? o->description() : "(null)"; }
 
 std::string formatArgs(std::string_view fmt, const std::vector<FormatArg>& args) {
   std::string out;

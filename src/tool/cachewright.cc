@@ -7,12 +7,12 @@
 
 #include "cache/module_cache.h"
 #include "modules/module_factory.h"
-#include "platform/dictionary.h"
 #include "platform/file_io.h"
 #include "platform/log.h"
-#include "platform/property_list.h"
-#include "platform/string.h"
+#include "plist/property_list.h"
 #include "tool/discovery.h"
+#include "values/dictionary.h"
+#include "values/string.h"
 
 namespace qr {
 

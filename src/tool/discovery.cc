@@ -8,15 +8,15 @@
 #include <string>
 #include <vector>
 
+#include "bundles/bundle.h"
 #include "modules/io_module.h"
 #include "modules/module_factory.h"
 #include "modules/pbm_module.h"
 #include "modules/pm_module.h"
-#include "platform/array.h"
-#include "platform/bundle.h"
 #include "platform/locations.h"
-#include "platform/prefs_store.h"
-#include "platform/property_list.h"
+#include "plist/property_list.h"
+#include "store/prefs_store.h"
+#include "values/array.h"
 
 namespace qr {
 namespace {

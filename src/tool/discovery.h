@@ -6,7 +6,7 @@
 #include "hosts/iom_host.h"
 #include "hosts/pbm_host.h"
 #include "hosts/pm_host.h"
-#include "platform/dictionary.h"
+#include "values/dictionary.h"
 
 namespace qr {
 

@@ -9,9 +9,9 @@
 #include <filesystem>
 
 #include "fixtures/fixture_support.h"
-#include "platform/data.h"
-#include "platform/property_list.h"
+#include "plist/property_list.h"
 #include "support/temp_dir.h"
+#include "values/data.h"
 
 using namespace qr;
 

@@ -8,8 +8,8 @@
 #include <string>
 #include <string_view>
 
-#include "platform/array.h"
-#include "platform/string.h"
+#include "values/array.h"
+#include "values/string.h"
 
 namespace deviceid_test {
 

@@ -4,9 +4,9 @@
 #include "device_id_test_support.h"
 #include "deviceid/dictionary_additions.h"
 #include "deviceid/string_additions.h"
-#include "platform/boolean.h"
-#include "platform/dictionary.h"
-#include "platform/number.h"
+#include "values/boolean.h"
+#include "values/dictionary.h"
+#include "values/number.h"
 
 using namespace deviceid_test;
 using namespace PMDictionaryAdditions;

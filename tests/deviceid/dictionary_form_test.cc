@@ -5,7 +5,7 @@
 #include "device_id_test_support.h"
 #include "deviceid/percent_escape.h"
 #include "deviceid/string_additions.h"
-#include "platform/dictionary.h"
+#include "values/dictionary.h"
 
 using namespace deviceid_test;
 using namespace PMStringAdditions;

@@ -8,13 +8,13 @@
 #include "device_id_test_support.h"
 #include "deviceid/device_id_json.h"
 #include "deviceid/pmdeviceid_tool.h"
-#include "platform/boolean.h"
-#include "platform/data.h"
-#include "platform/date.h"
-#include "platform/dictionary.h"
-#include "platform/number.h"
 #include "support/run_program.h"
 #include "support/temp_dir.h"
+#include "values/boolean.h"
+#include "values/data.h"
+#include "values/date.h"
+#include "values/dictionary.h"
+#include "values/number.h"
 
 using namespace deviceid_test;
 using qr::deviceid::deviceDictionaryRecord;

@@ -5,12 +5,12 @@
 
 #include <filesystem>
 
-#include "platform/c_bridge.h"
-#include "platform/string.h"
+#include "bundles/c_bridge.h"
 #include "support/plugin_bundle.h"
 #include "support/plugin_instance.h"
 #include "support/run_program.h"
 #include "support/temp_dir.h"
+#include "values/string.h"
 
 namespace fs = std::filesystem;
 

@@ -4,12 +4,12 @@
 
 #include <cstdio>
 
+#include "bundles/c_bridge.h"
 #include "cache/module_cache.h"
 #include "fixtures/fixture_support.h"
 #include "hosts/pm_host.h"
 #include "modules/module_factory.h"
 #include "modules/pbm_module.h"
-#include "platform/c_bridge.h"
 
 using namespace qr;
 using qr::test::CapturedLog;

@@ -4,9 +4,9 @@
 
 #include <cmath>
 
-#include "platform/array.h"
-#include "platform/dictionary.h"
-#include "platform/number.h"
+#include "values/array.h"
+#include "values/dictionary.h"
+#include "values/number.h"
 
 namespace qrtest {
 

@@ -7,7 +7,7 @@
 #include <cstring>
 #include <string>
 
-#include "platform/plugin_model.h"
+#include "bundles/plugin_model.h"
 
 namespace qrtest {
 

@@ -5,12 +5,12 @@
 
 #include <filesystem>
 
-#include "platform/dictionary.h"
-#include "platform/property_list.h"
-#include "platform/string.h"
+#include "plist/property_list.h"
 #include "support/run_program.h"
 #include "support/temp_dir.h"
 #include "tool/cachewright.h"
+#include "values/dictionary.h"
+#include "values/string.h"
 
 using namespace qr;
 using qrtest::ProgramOptions;

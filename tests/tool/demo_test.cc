@@ -9,12 +9,12 @@
 #include <string>
 #include <vector>
 
-#include "platform/array.h"
-#include "platform/dictionary.h"
-#include "platform/property_list.h"
-#include "platform/string.h"
+#include "plist/property_list.h"
 #include "support/run_program.h"
 #include "support/temp_dir.h"
+#include "values/array.h"
+#include "values/dictionary.h"
+#include "values/string.h"
 
 using namespace qr;
 

@@ -7,7 +7,7 @@
 #include <algorithm>
 #include <filesystem>
 
-#include "platform/prefs_store.h"
+#include "store/prefs_store.h"
 #include "support/plugin_bundle.h"
 #include "support/temp_dir.h"
 

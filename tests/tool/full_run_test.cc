@@ -8,14 +8,14 @@
 #include "cache/module_cache.h"
 
 #include "fixtures/fixture_support.h"
-#include "platform/array.h"
-#include "platform/deep_copy.h"
-#include "platform/dictionary.h"
-#include "platform/property_list.h"
-#include "platform/url.h"
+#include "plist/property_list.h"
 #include "support/run_program.h"
 #include "support/temp_dir.h"
 #include "tool/discovery.h"
+#include "values/array.h"
+#include "values/deep_copy.h"
+#include "values/dictionary.h"
+#include "values/url.h"
 
 using namespace qr;
 using qr::test::fixtureBundle;

@@ -1,0 +1,68 @@
+#include "plist/xml_string_table.h"
+
+#include <cstring>
+
+namespace qr::xmlplist {
+namespace {
+
+// A word-at-a-time hash private to the table; it need not match String::hash.
+uint64_t hashText(std::string_view s) noexcept {
+  uint64_t h = 0x9E3779B97F4A7C15ull ^ s.size();
+  const char* p = s.data();
+  size_t n = s.size();
+  for (; n >= 8; p += 8, n -= 8) {
+    uint64_t w;
+    std::memcpy(&w, p, 8);
+    h = (h ^ w) * 0xBF58476D1CE4E5B9ull;
+    h ^= h >> 31;
+  }
+  if (n) {
+    uint64_t w = 0;
+    std::memcpy(&w, p, n);
+    h = (h ^ w) * 0x94D049BB133111EBull;
+  }
+  return h ^ (h >> 29);
+}
+
+// Crafted text could make many strings collide; a lookup that has probed
+// this far gives up sharing rather than let the parse turn quadratic.
+constexpr size_t kMaxProbes = 32;
+
+}  // namespace
+
+StringTable::~StringTable() {
+  for (Slot& s : slots_)
+    if (s.string) s.string->release();
+}
+
+Ref<String> StringTable::intern(std::string_view ascii) {
+  if (!isASCII(ascii)) return nullptr;
+  if (slots_.empty()) grow();
+  uint64_t h = hashText(ascii);
+  size_t mask = slots_.size() - 1;
+  size_t i = h & mask;
+  for (size_t probes = 0; probes < kMaxProbes; ++probes, i = (i + 1) & mask) {
+    Slot& slot = slots_[i];
+    if (!slot.string) break;
+    if (slot.hash == h && slot.string->narrow() == ascii) return Ref<String>(slot.string);
+  }
+  Ref<String> s = String::fromUTF8(ascii);
+  if (slots_[i].string || used_ >= capacity_) return s;  // not shared
+  slots_[i] = {h, Ref<String>(s).leak()};
+  if (++used_ * 2 > slots_.size()) grow();
+  return s;
+}
+
+void StringTable::grow() {
+  std::vector<Slot> old = std::move(slots_);
+  slots_.assign(old.empty() ? 256 : old.size() * 2, Slot());
+  size_t mask = slots_.size() - 1;
+  for (const Slot& s : old) {
+    if (!s.string) continue;
+    size_t i = s.hash & mask;
+    while (slots_[i].string) i = (i + 1) & mask;
+    slots_[i] = s;
+  }
+}
+
+}  // namespace qr::xmlplist

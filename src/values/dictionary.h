@@ -1,0 +1,90 @@
+// Key-value collections keyed by any object with value equality and hashing,
+// enumerating in insertion order. Small dictionaries are searched linearly;
+// larger ones keep an open-addressing index beside the entry list.
+#pragma once
+
+#include <string_view>
+#include <utility>
+#include <vector>
+
+#include "values/object.h"
+
+namespace qr {
+
+class String;
+class MutableDictionary;
+
+class Dictionary : public Object {
+ public:
+  struct Entry {
+    Ref<Object> key;  // null marks a removed entry
+    Ref<Object> value;
+    size_t hash = 0;
+  };
+
+  Dictionary() = default;
+  Dictionary(const Dictionary&) = delete;
+  ~Dictionary() override;
+
+  // An immutable dictionary of the pairs in order; a repeated key keeps its
+  // first position and its last value.
+  static Ref<Dictionary> build(std::vector<std::pair<Ref<Object>, Ref<Object>>> pairs);
+  // Shallow copies: keys and values are shared.
+  Ref<Dictionary> copy() const;
+  Ref<MutableDictionary> mutableCopy() const;
+
+  size_t count() const noexcept { return live_; }
+  bool isEmpty() const noexcept { return live_ == 0; }
+  Object* get(const Object& key) const noexcept;
+  Object* get(const Ref<Object>& key) const noexcept { return key ? get(*key) : nullptr; }
+  // Lookup by an ASCII or UTF-8 string key without building a key object.
+  Object* get(std::string_view key) const noexcept;
+  template <class T>
+  T* getAs(std::string_view key) const noexcept {
+    return dynamic_cast<T*>(get(key));
+  }
+  bool contains(const Object& key) const noexcept { return get(key) != nullptr; }
+
+  // Calls f(key, value) for every entry in insertion order.
+  template <class F>
+  void forEach(F&& f) const {
+    for (const Entry& e : entries_)
+      if (e.key) f(*e.key, *e.value);
+  }
+  std::vector<Ref<Object>> keys() const;
+
+  TypeKind kind() const noexcept override { return TypeKind::Dictionary; }
+  bool isEqual(const Object& other) const noexcept override;
+  size_t hash() const noexcept override { return live_; }
+  std::string description() const override;
+
+ protected:
+  void setValue(Ref<Object> key, Ref<Object> value);
+  bool removeValue(const Object& key);
+  void clear() noexcept;
+  void reserveEntries(size_t n) { entries_.reserve(n); }
+
+ private:
+  template <class Match>
+  size_t find(size_t hash, Match&& match) const noexcept;
+  void rebuildIndex();
+  void compact();
+
+  std::vector<Entry> entries_;
+  std::vector<uint32_t> index_;  // entry position + 1; 0 empty; kTombstone removed
+  size_t live_ = 0;
+};
+
+class MutableDictionary final : public Dictionary {
+ public:
+  MutableDictionary() = default;
+  // Replaces the value of an equal key in place, keeping its position.
+  void set(Ref<Object> key, Ref<Object> value) { setValue(std::move(key), std::move(value)); }
+  void set(std::string_view key, Ref<Object> value);
+  bool remove(const Object& key) { return removeValue(key); }
+  bool remove(std::string_view key);
+  void removeAll() noexcept { clear(); }
+  void reserve(size_t n) { reserveEntries(n); }
+};
+
+}  // namespace qr

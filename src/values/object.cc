@@ -1,0 +1,15 @@
+#include "values/object.h"
+
+#include <cstdio>
+
+namespace qr {
+
+std::string Object::description() const {
+  char buf[48];
+  std::snprintf(buf, sizeof buf, "<Object %p>", static_cast<const void*>(this));
+  return buf;
+}
+
+std::string describe(const Object* o) { return o ? o->description() : "(null)"; }
+
+}  // namespace qr
