@@ -14,6 +14,8 @@ run_suite() {
   ctest --test-dir "$dir" -j "$jobs" --output-on-failure
 }
 
+echo "== include layers"
+scripts/check-layers.sh
 echo "== tests"
 run_suite build/test -DCMAKE_BUILD_TYPE=RelWithDebInfo
 echo "== tests under AddressSanitizer + UndefinedBehaviorSanitizer"
