@@ -1,170 +1,177 @@
-// Hosts and records answered from the module cache, so no plug-in code runs.
+// The hosts: registries of modules filed by normal form, the connection
+// records of the I/O modules with their titles and order, and the lookup
+// lists of the printer modules.
 #include <gtest/gtest.h>
-#include <quarrin/plugin.h>
 
-#include "cache/module_cache.h"
+#include <algorithm>
+#include <tuple>
+
+#include "fixtures/fixture_support.h"
 #include "hosts/iom_host.h"
 #include "hosts/pbm_host.h"
 #include "hosts/pm_host.h"
-#include "modules/module_factory.h"
-#include "platform/log.h"
-#include "support/plugin_bundle.h"
 
 using namespace qr;
+using namespace qr::test;
 
 namespace {
 
-const char kFactory[] = "11111111-2222-3333-4444-555555555555";
+using Hosts = FixtureTest;
 
-class Hosts : public ::testing::Test {
- protected:
-  void SetUp() override {
-    cache().setCacheDict(make<MutableDictionary>());
-    previousSink_ = setLogSink([](std::string_view) {});
-  }
-  void TearDown() override { setLogSink(previousSink_); }
-  static QuarrinModuleCache& cache() { return QuarrinModuleCache::defaultCache(); }
+// A file under the fixture directory, spelled relative to it.
+Ref<URL> relativeURL(const std::string& path) {
+  return URL::fileURL(path, true, URL::fileURL(QUARRIN_FIXTURE_DIR, true));
+}
 
-  Ref<URL> bundle(const std::string& name, const char* type) {
-    std::string path = dir_ / name;
-    qrtest::writePluginBundle(path, {{type, {kFactory}}}, "1.0");
-    return URL::fileURL(path, true);
-  }
-  Ref<QuarrinModule> module(const Ref<URL>& url) {
-    return QuarrinModuleFactory::pluginForURL(url.get());
-  }
+// What describe() says of an object, URLs under the fixture directory as the
+// rest of them: "c_pm.plugin/".
+std::string named(const Object* object) {
+  std::string text = describe(object), dir = relativeURL(".")->absoluteString();
+  for (size_t at; (at = text.find(dir)) != std::string::npos;) text.erase(at, dir.size());
+  return text;
+}
 
-  static Ref<MutableArray> info(std::initializer_list<const char*> kinds) {
-    auto array = make<MutableArray>();
-    for (const char* kind : kinds) {
-      auto entry = make<MutableDictionary>();
-      entry->set("Printer Browser Kind", String::make(kind));
-      array->append(entry);
-    }
-    return array;
-  }
+template <class Host>
+Ref<Host> hostOf(std::initializer_list<const char*> fixtures) {
+  auto host = make<Host>();
+  for (const char* fixture : fixtures)
+    host->addPlugin(QuarrinModuleFactory::pluginForURL(fixtureURL(fixture).get()),
+                    fixtureURL(fixture).get());
+  return host;
+}
 
-  qrtest::TempDir dir_;
-  LogSink previousSink_;
-};
-
-TEST_F(Hosts, TheRegistryKeysModulesByNormalFormAndReleasesThemOnce) {
-  auto url = bundle("P.plugin", QR_PM_TYPE_ID);
-  Ref<QuarrinModule> first = module(url), second = module(url);
+TEST_F(Hosts, TheRegistryFilesByNormalFormKeepsTheLaterModuleAndReleasesItOnce) {
+  auto url = fixtureURL("c_pm");
+  Ref<PMModule> first = QuarrinModuleFactory::PMModuleForURL(url.get()),
+                second = QuarrinModuleFactory::PMModuleForURL(url.get());
   {
     auto host = make<PMHost>();
     host->addPlugin(first, nullptr);
     EXPECT_EQ(host->loadedPlugins()->count(), 0u);
-
-    auto base = URL::fileURL(dir_.path(), true);
-    auto relative = URL::fileURL("P.plugin", true, base);
     host->addPlugin(first, url.get());
-    host->addPlugin(second, relative.get());
+    host->addPlugin(second, relativeURL("c_pm.plugin").get());
     EXPECT_EQ(host->loadedPlugins()->count(), 1u);
-    EXPECT_EQ(host->pmInterfaceForURL(url.get()), second.get()) << "the later module replaces";
+    EXPECT_EQ(host->pmInterfaceForURL(url.get()), second.get());
     EXPECT_EQ(first->retainCount(), 1u);
     EXPECT_EQ(second->retainCount(), 2u);
   }
-  EXPECT_EQ(second->retainCount(), 1u) << "the host let its reference go exactly once";
+  EXPECT_EQ(second->retainCount(), 1u);
+
+  auto browsers = make<PBMHost>();
+  Ref<PBMModule> browser = browsers->pbmInterfaceForURL(fixtureURL("c_pbm").get());
+  ASSERT_TRUE(browser);
+  EXPECT_EQ(browsers->pbmInterfaceForURL(relativeURL("c_pbm.plugin").get()), browser);
+  EXPECT_FALSE(browsers->pbmInterfaceForURL(url.get())) << "no browser";
+  EXPECT_FALSE(browsers->pbmInterfaceForURL(nullptr));
+  EXPECT_EQ(browsers->loadedPlugins()->count(), 1u);
 }
 
-TEST_F(Hosts, ConnectionRecordsComeFromModulesThatNameBothValues) {
-  auto host = make<IOMHost>();
-  EXPECT_EQ(host->connectionInfoList()->count(), 0u);
-  EXPECT_EQ(host->connectionInfoList(), host->connectionInfoList()) << "built once";
+TEST_F(Hosts, ConnectionRecordsComeFromTheIOModulesThatNameBothValues) {
+  auto host = hostOf<IOMHost>(
+      {"c_iom", "io_dnssd", "c_pm", "io_no_path", "io_quellnet", "io_failing", "c_factory_null"});
+  MutableArray* list = host->connectionInfoList();
+  EXPECT_EQ(named(list),
+            "(USB via c_iom.plugin/ browsed by USBBrowser.plugin/, "
+            "DNSSD via io_dnssd.plugin/ browsed by file:///opt/none/NetBrowser.plugin/, "
+            "Quellnet via io_quellnet.plugin/ browsed by io_quellnet.plugin/QuellBrowser.plugin/, "
+            "USB via io_failing.plugin/ browsed by io_failing.plugin/B.plugin/)");
+  EXPECT_EQ(host->connectionInfoList(), list);
+  for (const char* fixture : {"c_iom", "io_dnssd", "io_no_path", "io_quellnet", "io_failing"})
+    EXPECT_EQ(calls_.count(std::string(fixture) + " GetConnectionInfo"), 1u) << fixture;
 
-  auto host2 = make<IOMHost>();
-  auto usb1 = bundle("USB1.plugin", QR_IOM_TYPE_ID), usb2 = bundle("USB2.plugin", QR_IOM_TYPE_ID);
-  auto serial = bundle("Serial.plugin", QR_IOM_TYPE_ID);
-  cache().addInfoForIOModule(usb1.get(), String::make("USB").get(),
-                             String::make("../B.plugin").get());
-  cache().addInfoForIOModule(usb2.get(), String::make("USB").get(),
-                             String::make("/opt/B.plugin").get());
-  cache().addInfoForIOModule(serial.get(), String::make("Serial").get(), nullptr);
-  for (const auto& url : {usb1, usb2, serial}) host2->addPlugin(module(url), url.get());
-
-  MutableArray* list = host2->connectionInfoList();
-  ASSERT_EQ(list->count(), 2u) << "a module without a browser path gives no record";
-  auto* a = cast<ConnectionInfo>(list->at(0));
-  auto* b = cast<ConnectionInfo>(list->at(1));
-  EXPECT_TRUE(a->connectionType()->equals("USB"));
-  EXPECT_TRUE(b->connectionType()->equals("USB"));
-  EXPECT_EQ(a->PBMURL()->absoluteString(), URL::fileURL(dir_ / "B.plugin", true)->absoluteString());
-  EXPECT_EQ(b->PBMURL()->absoluteString(), "file:///opt/B.plugin/");
-  EXPECT_EQ(a->IOMURL()->absoluteString(), usb1->absoluteString());
-
-  EXPECT_EQ(host2->iomURLForConnectionType(*String::make("USB"))->absoluteString(),
-            usb1->absoluteString());
-  EXPECT_EQ(host2->iomURLForConnectionType(*String::make("Serial"))->absoluteString(),
-            serial->absoluteString())
-      << "found through its cache entry";
-  EXPECT_FALSE(host2->iomURLForConnectionType(*String::make("FireWire")));
+  // The first record's module, else one whose cache entry names the type.
+  for (auto [type, module] :
+       {std::pair{"USB", "c_iom.plugin/"}, std::pair{"DNSSD", "io_dnssd.plugin/"},
+        std::pair{"Serial", "io_no_path.plugin/"}, std::pair{"FireWire", "(null)"}})
+    EXPECT_EQ(named(host->iomURLForConnectionType(*String::make(type)).get()), module) << type;
 }
 
-TEST_F(Hosts, LookupListsAreFilledOnceAndItemsReferBackToThemselves) {
-  auto host = make<PMHost>();
-  auto laser = bundle("Laser.plugin", QR_PM_TYPE_ID), ink = bundle("Ink.plugin", QR_PM_TYPE_ID);
-  cache().addInfo(info({"laser-a", "laser-b"}).get(), laser.get(), String::make("USB").get());
-  cache().addInfo(info({"ink"}).get(), ink.get(), String::make("USB").get());
-  cache().addInfo(nullptr, ink.get(), String::make("Serial").get());
-  cache().addInfo(nullptr, laser.get(), String::make("Serial").get());
-  for (const auto& url : {laser, ink}) host->addPlugin(module(url), url.get());
-
-  auto usb = String::make("USB");
-  LookupInfoList* list = host->GetLookupInfoList(*usb);
-  ASSERT_EQ(list->maxIndex(), 3u);
-  EXPECT_EQ(host->GetLookupInfoList(*usb), list);
-  LookupInfoItem* item = list->getItemAtIndex(1);
-  MutableDictionary* lookup = item->lookupInfo();
-  EXPECT_TRUE(cast<String>(lookup->get("connectionType"))->equals("USB"));
-  EXPECT_EQ(lookup->get("PrBrowser Lookup Reference"), item);
-  EXPECT_TRUE(cast<String>(lookup->get("Printer Browser Kind"))->equals("laser-b"));
-  EXPECT_EQ(item->pmURL()->absoluteString(), laser->absoluteString());
-  EXPECT_FALSE(item->getIcon()) << "the cache keeps no icons";
-
-  Ref<Dictionary> copy = item->copyLookupInfoDict();
-  EXPECT_FALSE(cast<MutableDictionary>(copy));
-  EXPECT_EQ(copy->get("PrBrowser Lookup Reference"), item);
-  lookup->set("Printer Browser Kind", String::make("edited"));
-  auto again = cache().getInfoForPrinterModule(laser.get(), usb.get());
-  EXPECT_TRUE(
-      cast<String>(cast<Dictionary>(again->at(1))->get("Printer Browser Kind"))->equals("laser-b"))
-      << "an item's dictionary is its own";
-
-  LookupInfoList* serial = host->GetLookupInfoList(*String::make("Serial"));
-  EXPECT_EQ(serial->maxIndex(), 0u);
-  EXPECT_EQ(host->lookupLists()->count(), 2u);
-  EXPECT_EQ(host->lookupLists()->at(0), list) << "in the order first requested";
-  cache().addInfo(info({"late"}).get(), ink.get(), String::make("Serial").get());
-  EXPECT_EQ(host->GetLookupInfoList(*String::make("Serial")), serial);
-  EXPECT_EQ(serial->maxIndex(), 1u) << "an empty list asks every module again";
-}
-
-TEST_F(Hosts, AnItemOutlivesItsListThroughACopy) {
-  Ref<Dictionary> copy;
-  {
-    auto list = make<LookupInfoList>(String::make("USB"));
-    auto entry = make<MutableDictionary>();
-    entry->set("k", String::make("v"));
-    list->addItem(make<LookupInfoItem>(URL::fileURL("/x.plugin", true).get(), entry.get()));
-    copy = list->getItemAtIndex(0)->copyLookupInfoDict();
-    EXPECT_FALSE(entry->get("PrBrowser Lookup Reference")) << "the argument is not changed";
+TEST_F(Hosts, ALookupListHoldsEveryModulesEntriesAndIsFilledAgainOnlyWhileEmpty) {
+  auto host = hostOf<PMHost>({"c_pm", "c_iom", "pm_serial", "pm_usb_only"});
+  std::pair<const char*, std::vector<std::string>> cases[] = {
+      {"USB",
+       {"Fixture Laser 1 c_pm.plugin/", "Fixture Laser 2 c_pm.plugin/", "usb-1 pm_usb_only.plugin/",
+        "usb-2 pm_usb_only.plugin/"}},
+      {"Serial", {"serial-1 pm_serial.plugin/"}},  // its entry that is no dictionary is left out
+      {"FireWire", {}},
+  };
+  for (const auto& [type, expected] : cases) {
+    LookupInfoList* list = host->GetLookupInfoList(*String::make(type));
+    EXPECT_EQ(host->GetLookupInfoList(*String::make(type)), list) << "asked again only if empty";
+    std::vector<std::string> items;
+    for (uint32_t i = 0; i < list->maxIndex(); ++i) {
+      LookupInfoItem* item = list->getItemAtIndex(i);
+      MutableDictionary* lookup = item->lookupInfo();
+      EXPECT_EQ(describe(lookup->get("connectionType")), type);
+      EXPECT_EQ(lookup->get("PrBrowser Lookup Reference"), item);
+      items.push_back(describe(lookup->get("Printer Browser Kind")) + " " +
+                      named(item->pmURL().get()));
+    }
+    EXPECT_EQ(items, expected) << type;
+    for (const char* fixture : {"c_pm", "pm_serial", "pm_usb_only"})
+      EXPECT_EQ(calls_.count(std::string(fixture) + " CreateBrowserInfo connectionType=" + type),
+                expected.empty() ? 2u : 1u)
+          << fixture << " " << type;
   }
-  auto* item = cast<LookupInfoItem>(copy->get("PrBrowser Lookup Reference"));
-  ASSERT_TRUE(item);
-  EXPECT_TRUE(cast<String>(item->lookupInfo()->get("k"))->equals("v"));
 }
 
-TEST_F(Hosts, TheBrowserHostLoadsAModuleOnceAndFindsItByNormalForm) {
-  auto host = make<PBMHost>();
-  auto url = bundle("Browser.plugin", QR_PBM_TYPE_ID);
-  Ref<PBMModule> first = host->pbmInterfaceForURL(url.get());
-  ASSERT_TRUE(first);
-  auto relative = URL::fileURL("Browser.plugin", true, URL::fileURL(dir_.path(), true));
-  EXPECT_EQ(host->pbmInterfaceForURL(relative.get()), first);
-  EXPECT_EQ(host->loadedPlugins()->count(), 1u);
-  EXPECT_FALSE(host->pbmInterfaceForURL(bundle("P.plugin", QR_PM_TYPE_ID).get()));
-  EXPECT_FALSE(host->pbmInterfaceForURL(nullptr));
+// A record whose browser is the fixture of that name, or the path given.
+Ref<ConnectionInfo> record(const std::string& browser, const char* type = "USB") {
+  bool fixture = browser.find_first_of("/.") == std::string::npos;
+  return ConnectionInfo::connectionInfoWithInfo(
+      String::make(type), fixtureURL("c_iom"),
+      relativeURL(fixture ? browser + ".plugin" : browser));
+}
+
+TEST_F(Hosts, ARecordsTitleIsItsBrowsersOwnElseFromItsTableElseItsIdentifier) {
+  // Browser, type, whether the title is asked before the identifier, the title
+  // ("id": the identifier), title-only opens, and the identifier (none: that of the fixture).
+  std::tuple<std::string, const char*, bool, const char*, size_t, const char*> cases[] = {
+      {"c_pbm", "USB", true, "Fixture Browser", 1, nullptr},
+      {"pbm_lower_title", "USB", true, "delta browser", 1, nullptr},
+      {"pbm_first_party", "USB", true, "zebra first party", 1, "com.varnex.print.pbm.Fixture"},
+      {"pbm_untitled", "USB", true, "(null)", 2, nullptr},  // asked again
+      {"pbm_localized", "USB", true, "Own Title", 1, nullptr},
+      // The table names the browser by its identifier, else by the connection type.
+      {"pbm_localized", "USB", false, "Localized Browser", 0, nullptr},
+      {"pbm_by_connection", "Serial", false, "Serial Ports", 0, nullptr},
+      {"pbm_by_connection", "Serial", true, "id", 0, nullptr},  // it has no code
+      {"pbm_by_connection", "USB", false, "id", 0, nullptr},
+      {"pbm_prologue_fails", "USB", true, "id", 1, nullptr},
+      {"pbm_raises", "USB", true, "id", 1, nullptr},
+      {"cxx_pbm_throws", "USB", true, "id", 1, nullptr},
+      {"c_pm", "USB", true, "id", 0, nullptr},
+      {"/nonexistent/Browser", "USB", true, "id", 0, ""},
+      {"c_pbm.plugin/Contents/Info.plist", "USB", true, "id", 0, ""},
+      {".", "USB", true, "id", 0, "(null)"},  // a directory that is no bundle
+  };
+  std::vector<Ref<ConnectionInfo>> records;
+  for (auto [browser, type, titleFirst, title, prologues, identifier] : cases) {
+    SCOPED_TRACE(browser + " " + type + (titleFirst ? " title first" : ""));
+    auto r = records.emplace_back(record(browser, type));
+    std::string id = identifier ? identifier : "org.quarrin.test." + browser;
+    size_t before = calls_.count(browser + " Prologue flags=1");
+    if (titleFirst) r->connectionTitle();
+    EXPECT_EQ(describe(r->connectionBundleID().get()), id);
+    EXPECT_EQ(describe(r->connectionTitle().get()), title == std::string("id") ? id : title);
+    EXPECT_EQ(calls_.count(browser + " Prologue flags=1") - before, prologues);
+  }
+  EXPECT_EQ(log_.count("on call to 'Prologue' for " + quoted("pbm_raises")), 1u);
+
+  // First-party browsers first, then titles ignoring case, then no title.
+  std::stable_sort(records.begin(), records.end(),
+                   [](const auto& a, const auto& b) { return a->compare(*b) < 0; });
+  std::string titles;
+  for (const auto& r : records) titles += describe(r->connectionTitle().get()) + "|";
+  EXPECT_EQ(titles,
+            "zebra first party|||delta browser|Fixture Browser|Localized Browser|"
+            "org.quarrin.test.c_pm|org.quarrin.test.cxx_pbm_throws|"
+            "org.quarrin.test.pbm_by_connection|org.quarrin.test.pbm_by_connection|"
+            "org.quarrin.test.pbm_prologue_fails|org.quarrin.test.pbm_raises|Own Title|"
+            "Serial Ports|(null)|(null)|");
+  EXPECT_EQ(records[1]->compare(*records[2]), 0);
+  EXPECT_EQ(records[14]->compare(*records[15]), 1) << "without titles each sorts after the other";
+  EXPECT_EQ(records[15]->compare(*records[14]), 1);
 }
 
 }  // namespace

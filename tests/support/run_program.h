@@ -23,7 +23,6 @@ struct ProgramResult {
 struct ProgramOptions {
   std::vector<std::string> args;
   std::map<std::string, std::string> env;  // added to (or replacing) the test's environment
-  std::vector<std::string> unsetEnv;
   std::string input;
   std::string stdoutPath;  // when set, standard output goes to this file (e.g. /dev/full)
 };
@@ -35,14 +34,10 @@ inline ProgramResult runProgram(const std::string& program, const ProgramOptions
   const std::string out = o.stdoutPath.empty() ? dir / "stdout" : o.stdoutPath;
   pid_t pid = fork();
   if (pid == 0) {
-    auto redirect = [](const std::string& path, int flags, int target) {
-      int fd = open(path.c_str(), flags, 0644);
-      if (fd < 0 || dup2(fd, target) < 0) _exit(127);
-    };
-    redirect(in, O_RDONLY, 0);
-    redirect(out, O_WRONLY | O_CREAT | O_TRUNC, 1);
-    redirect(err, O_WRONLY | O_CREAT | O_TRUNC, 2);
-    for (const auto& name : o.unsetEnv) unsetenv(name.c_str());
+    int fds[] = {open(in.c_str(), O_RDONLY), open(out.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644),
+                 open(err.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0644)};
+    for (int target = 0; target < 3; ++target)
+      if (fds[target] < 0 || dup2(fds[target], target) < 0) _exit(127);
     for (const auto& [k, v] : o.env) setenv(k.c_str(), v.c_str(), 1);
     std::vector<char*> argv{const_cast<char*>(program.c_str())};
     for (const auto& a : o.args) argv.push_back(const_cast<char*>(a.c_str()));

@@ -27,10 +27,9 @@ inline std::string readText(const std::string& path) {
 // A temporary directory for one test, removed with everything in it.
 class TempDir {
  public:
-  explicit TempDir(const std::filesystem::path& base = std::filesystem::temp_directory_path()) {
-    std::string pattern = (base / "quarrin-test-XXXXXX").string();
-    if (!::mkdtemp(pattern.data())) std::abort();
-    path_ = pattern;
+  explicit TempDir(const std::filesystem::path& base = std::filesystem::temp_directory_path())
+      : path_((base / "quarrin-test-XXXXXX").string()) {
+    if (!::mkdtemp(path_.data())) std::abort();
   }
   ~TempDir() {
     std::error_code ignored;
@@ -40,14 +39,11 @@ class TempDir {
   TempDir& operator=(const TempDir&) = delete;
 
   const std::string& path() const { return path_; }
-  std::string operator/(std::string_view relative) const {
-    return path_ + "/" + std::string(relative);
-  }
+  std::string operator/(std::string_view relative) const { return path_ + "/" += relative; }
   // Writes a file inside the directory and gives its full path.
   std::string write(std::string_view relative, std::string_view bytes) const {
-    std::string full = *this / relative;
-    writeText(full, bytes);
-    return full;
+    writeText(*this / relative, bytes);
+    return *this / relative;
   }
 
  private:
@@ -57,10 +53,7 @@ class TempDir {
 // Memory-backed scratch space where there is some: tests that sync files
 // thousands of times run the same code there without waiting for a disk.
 inline std::filesystem::path memoryBackedTempBase() {
-  std::error_code error;
-  if (std::filesystem::is_directory("/dev/shm", error) && ::access("/dev/shm", W_OK) == 0)
-    return "/dev/shm";
-  return std::filesystem::temp_directory_path();
+  return ::access("/dev/shm", W_OK) == 0 ? "/dev/shm" : std::filesystem::temp_directory_path();
 }
 
 // Sets or unsets environment variables and restores them on destruction.
@@ -77,10 +70,7 @@ class EnvGuard {
 
  private:
   static void apply(const std::string& name, const std::optional<std::string>& value) {
-    if (value)
-      ::setenv(name.c_str(), value->c_str(), 1);
-    else
-      ::unsetenv(name.c_str());
+    value ? ::setenv(name.c_str(), value->c_str(), 1) : ::unsetenv(name.c_str());
   }
   std::vector<std::pair<std::string, std::optional<std::string>>> saved_;
 };

@@ -1,177 +1,94 @@
-// Runs the built cachewright against a temporary framework and store.
-#include <gmock/gmock.h>
+// cachewright as a black box, with module discovery off: arguments, standard
+// input, the store and the framework's default cache in; exit status, output,
+// log and the files it leaves out.
 #include <gtest/gtest.h>
-#include <sys/stat.h>
 
 #include <filesystem>
 
 #include "plist/property_list.h"
 #include "support/run_program.h"
-#include "support/temp_dir.h"
 #include "tool/cachewright.h"
 #include "values/dictionary.h"
-#include "values/string.h"
 
 using namespace qr;
-using qrtest::ProgramOptions;
-using qrtest::ProgramResult;
 
 namespace {
 
-const char kEmptyCacheXML[] =
-    "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<plist version=\"1.0\">\n<dict/>\n</plist>\n";
+// A property list as cachewright writes it, around a dictionary.
+std::string plist(std::string_view dict) {
+  return "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<plist version=\"1.0\">\n" +
+         std::string(dict) + "</plist>\n";
+}
 
-const char kOneEntryCacheXML[] =
-    "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<plist version=\"1.0\">\n<dict>\n"
-    "\t<key>file:///nowhere/A.plugin/</key>\n\t<dict>\n"
-    "\t\t<key>Bundle Version</key>\n\t\t<string>1.0</string>\n"
-    "\t\t<key>kIOMConnectionType</key>\n\t\t<string>USB</string>\n"
-    "\t</dict>\n</dict>\n</plist>\n";
+const char kEmpty[] = "<dict/>\n";
+const char kOne[] =
+    "<dict>\n\t<key>file:///nowhere/A.plugin/</key>\n\t<dict>\n"
+    "\t\t<key>Bundle Version</key>\n\t\t<string>1.0</string>\n\t</dict>\n</dict>\n";
 
-class Cachewright : public ::testing::Test {
- protected:
-  ProgramResult run(std::vector<std::string> args, std::string input = {},
-                    std::string stdoutPath = {}) {
-    ProgramOptions o;
-    o.args = std::move(args);
-    o.input = std::move(input);
-    o.stdoutPath = std::move(stdoutPath);
-    o.env["CACHEWRIGHT_FRAMEWORK"] = framework();
-    o.env["CACHEWRIGHT_PREFS"] = store();
-    return qrtest::runProgram(QUARRIN_BINARY_DIR "/src/cachewright", o);
-  }
-  std::string framework() const { return dir_ / "Zephrin.framework"; }
-  std::string store() const { return dir_ / "prefs/printing-prefs.plist"; }
-  bool storeExists() const { return std::filesystem::exists(store()); }
-
-  // The store as the program left it.
-  Ref<Dictionary> storedPrefs() const { return cast<Dictionary>(readPropertyListFile(store())); }
-  void writeStore(std::string_view cacheXMLBody) {
-    qrtest::writeText(store(), std::string("<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n"
-                                           "<plist version=\"1.0\">\n<dict>\n"
-                                           "<key>pmcache 5</key>\n") +
-                                   std::string(cacheXMLBody) + "</dict>\n</plist>\n");
-  }
-
-  qrtest::TempDir dir_;
-};
-
-TEST_F(Cachewright, ExitStatusOutputAndFilesForEachCommandLine) {
-  // {"k": {"Bundle Version": "1.0"}} in binary form: objects, offsets, trailer.
-  const std::string binary =
-      "bplist00\xd1\x01\x02Qk\xd1\x03\x04^Bundle VersionS1.0\x08\x0b\x0d\x10\x1f" +
-      std::string(6, '\0') + "\x01\x01" + std::string(7, '\0') + "\x05" + std::string(15, '\0') +
-      "#";
-  ASSERT_TRUE(readBinaryPropertyList(binary, Mutability::Immutable)) << "fixture is well formed";
-  const std::string usage = kCachewrightUsage,
-                    noCache = "Could not load internal printer module cache.";
-  const std::string path = dir_ / "cache.plist";
-  auto holds = [](const std::string& part) -> ::testing::Matcher<std::string> {
-    if (part.empty()) return ::testing::IsEmpty();
-    return ::testing::HasSubstr(part);
-  };
+TEST(Cachewright, ExitStatusOutputLogAndFilesForEachInvocation) {
+  const std::string one = plist(kOne), noCache = "Could not load internal printer module cache.";
   struct {
-    std::vector<std::string> args;
+    std::vector<std::string> args;  // a leading "/" is inside the run's directory
     std::string input;
+    const char* store;     // cache in the store before the run (nullptr: no store)
+    const char* resource;  // the framework's default cache (nullptr: none)
     int status;
-    std::string out;  // contained in standard output; empty: nothing there
-    std::string err;  // contained in standard error; empty: nothing there
-  } cases[] = {
-      // Bad options print the usage and touch nothing.
-      {{"-x"}, "", 1, "", usage},
-      {{"-?"}, "", 1, "", usage},
-      {{"-s", "-q"}, "", 1, "", usage},
-      // Stream mode with nothing anywhere prints an empty cache, and never writes the store.
-      {{"-s"}, "", 0, kEmptyCacheXML, noCache},
-      {{"-s", "-s"}, "", 0, kEmptyCacheXML, noCache},
-      {{"-s", path}, "", 0, kEmptyCacheXML, noCache},
-      // A cache from standard input is not loaded from anywhere else.
-      {{"-s"}, kOneEntryCacheXML, 0, kOneEntryCacheXML, ""},
-      {{"-s"},
-       binary,
-       0,
-       "<key>k</key>\n\t<dict>\n\t\t<key>Bundle Version</key>\n\t\t<string>1.0</string>",
-       ""},
-      // Default mode with discovery off never even loads the cache.
-      {{}, "", 0, "", ""},
-      {{path, "extra"}, "", 0, "", ""},
-      {{"cache.plist"}, "", 0, "", ""},
+    const char* out;     // the cache on standard output (nullptr: nothing)
+    std::string err;     // contained in standard error ("": nothing)
+    const char* stored;  // the cache in the store after the run (nullptr: untouched)
+    const char* file;    // the one file written into the run's directory (nullptr: none)
+    bool full = false;   // standard output is /dev/full
+  } rows[] = {
+      {{"-x"}, "", kOne, nullptr, 1, nullptr, kCachewrightUsage, nullptr, nullptr},
+      {{"-s", "-q"}, "", nullptr, nullptr, 1, nullptr, kCachewrightUsage, nullptr, nullptr},
+      {{"-s"}, "", nullptr, nullptr, 0, kEmpty, noCache, nullptr, nullptr},
+      {{"-s"}, "", nullptr, "<array/>\n", 0, kEmpty, noCache, nullptr, nullptr},
+      {{"-s", "/c.plist"}, "", nullptr, nullptr, 0, kEmpty, noCache, nullptr, nullptr},
+      {{"-s"}, one, kEmpty, kEmpty, 0, kOne, "", nullptr, nullptr},
+      {{"-s"}, "{{{", kOne, nullptr, 0, kOne, "", nullptr, nullptr},
+      {{"-s"}, "(\"a\")", kOne, nullptr, 0, kOne, "not a dictionary", nullptr, nullptr},
+      {{"-s"}, "", nullptr, kOne, 0, kOne, "", nullptr, nullptr},
+      {{"-s"}, "", kEmpty, kOne, 0, kEmpty, "", nullptr, nullptr},
+      {{"-s"}, "", kOne, nullptr, 1, nullptr, "Could not write", nullptr, nullptr, true},
+      {{}, "", kOne, nullptr, 0, nullptr, "", nullptr, nullptr},
+      {{"/c.plist", "x"}, "", kOne, nullptr, 0, nullptr, "", nullptr, nullptr},
+      {{"c.plist"}, "", kOne, nullptr, 0, nullptr, "", nullptr, nullptr},
+      {{"/c.plist"}, "", kOne, kOne, 0, nullptr, "", kEmpty, kEmpty},
+      {{"/none/c.plist"}, "", kOne, nullptr, 1, nullptr, "", kEmpty, nullptr},
+      {{"/caf\xE9.plist"}, "", nullptr, nullptr, 1, nullptr, "", kEmpty, nullptr},
   };
-  for (const auto& c : cases) {
-    SCOPED_TRACE(::testing::PrintToString(c.args) + " < " + c.input.substr(0, 20));
-    auto r = run(c.args, c.input);
-    EXPECT_EQ(r.status, c.status);
-    EXPECT_THAT(r.out, holds(c.out));
-    EXPECT_THAT(r.err, holds(c.err));
-    EXPECT_FALSE(storeExists());
-    EXPECT_FALSE(std::filesystem::exists(path));
+  for (const auto& r : rows) {
+    SCOPED_TRACE(::testing::PrintToString(r.args) + " < " + r.input);
+    qrtest::TempDir dir, files;
+    const std::string store = dir / "prefs.plist";
+    if (r.store)
+      dir.write("prefs.plist",
+                plist("<dict><key>pmcache 5</key>" + std::string(r.store) + "</dict>"));
+    if (r.resource) dir.write("Z.framework/Resources/com.varnex.pmcache.xml", plist(r.resource));
+    const std::string storeBefore = qrtest::readText(store);
+    qrtest::ProgramOptions o;
+    for (const auto& a : r.args) o.args.push_back(a.starts_with("/") ? files.path() + a : a);
+    o.env = {{"CACHEWRIGHT_FRAMEWORK", dir / "Z.framework"}, {"CACHEWRIGHT_PREFS", store}};
+    o.input = r.input;
+    o.stdoutPath = r.full ? "/dev/full" : "";
+    auto result = qrtest::runProgram(QUARRIN_BINARY_DIR "/src/cachewright", o);
+
+    EXPECT_EQ(result.status, r.status);
+    EXPECT_EQ(result.out, r.out ? plist(r.out) : "");
+    EXPECT_TRUE(r.err.empty() ? result.err.empty() : result.err.find(r.err) != std::string::npos)
+        << result.err;
+    auto prefs = cast<Dictionary>(readPropertyListFile(store));
+    if (r.stored)
+      EXPECT_TRUE(prefs &&
+                  prefs->get("pmcache 5")
+                      ->isEqual(*readPropertyList(plist(r.stored), Mutability::Immutable)));
+    else
+      EXPECT_EQ(qrtest::readText(store), storeBefore);
+    std::vector<std::string> written;
+    for (const auto& e : std::filesystem::directory_iterator(files.path()))
+      written.push_back(qrtest::readText(e.path()));
+    EXPECT_EQ(written, r.file ? std::vector{plist(r.file)} : std::vector<std::string>{});
   }
-  EXPECT_EQ(usage,
-            "Usage: cachewright [-s]\n    -s               Use stdin/stdout to read/write cache "
-            "dictionary.\n");
-}
-
-TEST_F(Cachewright, StreamModeFallsBackToTheStoreOnGarbageOrNonDictionaryInput) {
-  writeStore("<dict><key>from-store</key><dict/></dict>\n");
-  for (std::string input : {std::string("this is not a property list {"),
-                            std::string("<?xml version=\"1.0\"?><plist version=\"1.0\"><array>"
-                                        "<string>x</string></array></plist>")}) {
-    auto r = run({"-s"}, input);
-    EXPECT_EQ(r.status, 0);
-    EXPECT_NE(r.out.find("<key>from-store</key>"), std::string::npos) << r.out;
-  }
-  auto r = run({"-s"}, "( \"an\", \"array\" )");
-  EXPECT_NE(r.err.find("not a dictionary"), std::string::npos) << r.err;
-}
-
-TEST_F(Cachewright, TheDefaultCacheResourceIsUsedOnlyWithoutAStoredCache) {
-  qrtest::writeText(framework() + "/Resources/com.varnex.pmcache.xml", kOneEntryCacheXML);
-  auto r = run({"-s"});
-  EXPECT_EQ(r.out, kOneEntryCacheXML);
-  EXPECT_EQ(r.err, "");
-  writeStore("<dict/>\n");
-  r = run({"-s"});
-  EXPECT_EQ(r.out, kEmptyCacheXML);
-}
-
-TEST_F(Cachewright, AShortOrFailedWriteToStandardOutputIsAFailure) {
-  qrtest::writeText(framework() + "/Resources/com.varnex.pmcache.xml", kOneEntryCacheXML);
-  auto r = run({"-s"}, {}, "/dev/full");
-  EXPECT_EQ(r.status, 1);
-  EXPECT_NE(r.err.find("Could not write the printer module cache to standard output."),
-            std::string::npos)
-      << r.err;
-}
-
-TEST_F(Cachewright, PathModeStoresAndWritesTheSameEmptyCache) {
-  writeStore("<dict><key>old</key><dict/></dict>\n");
-  auto r = run({dir_ / "cache.plist"});
-  EXPECT_EQ(r.status, 0) << r.err;
-  EXPECT_EQ(qrtest::readText(dir_ / "cache.plist"), kEmptyCacheXML);
-  auto prefs = storedPrefs();
-  ASSERT_TRUE(prefs);
-  auto* cache = prefs->getAs<Dictionary>("pmcache 5");
-  ASSERT_TRUE(cache);
-  EXPECT_EQ(cache->count(), 0u) << "path mode starts from an empty cache";
-}
-
-TEST_F(Cachewright, PathModeWithAnUnwritablePathStillStoresButFails) {
-  auto r = run({dir_ / "missing-dir/cache.plist"});
-  EXPECT_EQ(r.status, 1);
-  EXPECT_TRUE(storeExists());
-  if (geteuid() != 0) {  // root writes through permissions
-    std::filesystem::create_directories(dir_ / "ro");
-    chmod((dir_ / "ro").c_str(), 0500);
-    EXPECT_EQ(run({dir_ / "ro/cache.plist"}).status, 1);
-  }
-}
-
-TEST_F(Cachewright, PathModeWithAPathThatIsNotUTF8KeepsTheStoreStatus) {
-  std::string path = dir_ / "caf\xE9.plist";
-  auto r = run({path});
-  EXPECT_EQ(r.status, 1) << "the cache changed, so it was stored";
-  EXPECT_FALSE(std::filesystem::exists(path));
-  EXPECT_TRUE(storeExists());
 }
 
 }  // namespace

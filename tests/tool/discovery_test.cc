@@ -1,169 +1,106 @@
+// Module discovery over a tree of plug-in bundles laid out for each case.
 #include "tool/discovery.h"
 
 #include <gtest/gtest.h>
 #include <quarrin/plugin.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <filesystem>
+#include <iterator>
+#include <sstream>
 
 #include "store/prefs_store.h"
 #include "support/plugin_bundle.h"
 #include "support/temp_dir.h"
 
 using namespace qr;
-using qrtest::writePluginBundle;
 
 namespace {
 
-const char kFactory1[] = "11111111-2222-3333-4444-555555555555";
-const char kFactory2[] = "11111111-2222-3333-4444-666666666666";
+const char kFactory[] = "11111111-2222-3333-4444-555555555555";
+const char kOther[] = "11111111-2222-3333-4444-666666666666";
 
-class Discovery : public ::testing::Test {
- protected:
-  void SetUp() override {
-    setenv("CACHEWRIGHT_PREFS", (dir_ / "prefs.plist").c_str(), 1);
-    setenv("CACHEWRIGHT_FRAMEWORK", (dir_ / "Zephrin.framework").c_str(), 1);
-    forgetDiscoverySettings();
-    support("YES");
-  }
-  void TearDown() override { forgetDiscoverySettings(); }
+// One item of a tree below root: "p:", "i:" or "b:" and a printer, I/O or
+// browser module bundle (the I/O one also declares a printer factory); "f:"
+// a plain file; "l:link=target" a symbolic link.
+void lay(const std::string& root, const std::string& item) {
+  std::string path = root + "/" + item.substr(2);
+  if (item[0] == 'f') return qrtest::writeText(path, "plain");
+  if (item[0] == 'l')
+    return std::filesystem::create_directory_symlink(root + "/" + path.substr(path.find('=') + 1),
+                                                     path.substr(0, path.find('=')));
+  std::vector<qrtest::PluginDeclaration> types{
+      {item[0] == 'b' ? QR_PBM_TYPE_ID : QR_PM_TYPE_ID, {kFactory}}};
+  if (item[0] == 'i') types.push_back({QR_IOM_TYPE_ID, {kOther}});
+  qrtest::writePluginBundle(path, types);
+}
 
-  void support(const char* value) {
-    setPrintingPref(*String::make("support_quarrin"), *String::make(value), 5);
-  }
-  // Search settings: roots, exact exclusions and exclusion patterns.
-  void settings(const std::vector<std::string>& roots,
-                const std::vector<std::string>& excluded = {},
-                const std::vector<std::string>& patterns = {}) {
-    auto list = [](const char* key, const std::vector<std::string>& items) {
-      std::string xml = std::string("<key>") + key + "</key><array>";
-      for (const auto& i : items) xml += "<string>" + i + "</string>";
-      return xml + "</array>";
-    };
-    qrtest::writeText(dir_ / "Zephrin.framework/Resources/com.varnex.pm.xml",
-                      "<plist version=\"1.0\"><dict>" + list("PM Search Directories", roots) +
-                          list("PM Exclude Directories", excluded) +
-                          list("PM Exclude Matches", patterns) + "</dict></plist>");
-  }
-  void printerModule(const std::string& path) {
-    writePluginBundle(path, {{QR_PM_TYPE_ID, {kFactory1}}});
-  }
+std::vector<std::string> words(const char* text) {
+  std::istringstream in(text);
+  return {std::istream_iterator<std::string>(in), {}};
+}
 
-  struct Found {
-    std::vector<std::string> pm, iom, pbm;
+TEST(Discovery, EachCaseFindsExactlyItsModules) {
+  struct {
+    const char* tree;   // items as lay() takes them
+    const char* roots;  // below the case's directory
+    const char* skip;   // excluded directories below it, and "*" patterns
+    const char* found;  // "p:", "i:" or "b:" by host and the path, sorted
+    int maxLevel = 200;
+    const char* gate = "YES";
+  } rows[] = {
+      {"p:P/A.plugin p:P/A.plugin/Contents/PlugIns/B.plugin i:P/V/IO.plugin b:P/V/Br.plugin "
+       "f:P/File.plugin p:P/NoInfo.plugin/Inner.plugin",
+       "P", "", "b:P/V/Br.plugin i:P/V/IO.plugin p:P/A.plugin"},
+      {"p:P/A.plugin", "P", "", "", 200, "yes"},
+      {"p:P/Foo/A.plugin p:P/Foobar/B.plugin p:P/Old/C.plugin p:P/V/Old/D/E.plugin "
+       "p:P/Older/F.plugin",
+       "P", "P/Foo */Old/*", "p:P/Foobar/B.plugin p:P/Older/F.plugin"},
+      {"p:P/Foo/A.plugin", "P/Foo/", "P/Foo", "p:P/Foo/A.plugin"},
+      {"p:E/Real.plugin p:P/Here.plugin l:P/Link.plugin=E/Real.plugin l:P/loop=P", "P", "",
+       "p:P/Here.plugin p:P/Link.plugin"},
+      {"p:P/A.plugin", "missing P", "", "p:P/A.plugin"},
+      {"p:R/One.plugin p:R/a/Two.plugin p:R/a/b/Three.plugin", "R", "", "p:R/One.plugin", 2},
+      {"p:R/One.plugin p:R/a/Two.plugin p:R/a/b/Three.plugin", "R", "",
+       "p:R/One.plugin p:R/a/Two.plugin", 3},
+      {"p:Root.plugin", "Root.plugin", "", "p:Root.plugin"},
+      {"p:P/A.plugin", "", "", ""},  // no search settings at all
   };
-  Found discover(int maxLevel = 200) {
+  for (const auto& r : rows) {
+    SCOPED_TRACE(r.tree);
+    qrtest::TempDir dir;
+    qrtest::EnvGuard env;
+    env.set("CACHEWRIGHT_PREFS", dir / "prefs.plist");
+    env.set("CACHEWRIGHT_FRAMEWORK", dir / "Z.framework");
+    forgetDiscoverySettings();
+    setPrintingPref(*String::make("support_quarrin"), *String::make(r.gate), 5);
+    for (const auto& item : words(r.tree)) lay(dir.path(), item);
+    std::string roots, excluded, patterns;
+    for (const auto& path : words(r.roots)) roots += "<string>" + (dir / path) + "</string>";
+    for (const auto& path : words(r.skip))
+      (path[0] == '*' ? patterns : excluded) +=
+          "<string>" + (path[0] == '*' ? path : dir / path) + "</string>";
+    if (*r.roots)
+      dir.write("Z.framework/Resources/com.varnex.pm.xml",
+                "<plist version=\"1.0\"><dict><key>PM Search Directories</key><array>" + roots +
+                    "</array><key>PM Exclude Directories</key><array>" + excluded +
+                    "</array><key>PM Exclude Matches</key><array>" + patterns +
+                    "</array></dict></plist>");
+
     PMHost pm;
     IOMHost iom;
     PBMHost pbm;
-    discoverModules(maxLevel, pm, iom, pbm);
-    auto paths = [](const QuarrinHost& host) {
-      std::vector<std::string> out;
-      host.loadedPlugins()->forEach([&](const Object& key, const Object&) {
-        out.push_back(*static_cast<const URL&>(key).fileSystemPath());
+    discoverModules(r.maxLevel, pm, iom, pbm);
+    std::vector<std::string> found;
+    for (auto [kind, host] : {std::pair<char, QuarrinHost*>{'p', &pm}, {'i', &iom}, {'b', &pbm}})
+      host->loadedPlugins()->forEach([&](const Object& key, const Object&) {
+        auto path = *static_cast<const URL&>(key).fileSystemPath();
+        found.push_back(kind + (":" + path.substr(dir.path().size() + 1)));
       });
-      std::sort(out.begin(), out.end());
-      return out;
-    };
-    return {paths(pm), paths(iom), paths(pbm)};
+    std::sort(found.begin(), found.end());
+    EXPECT_EQ(found, words(r.found));
   }
-
-  qrtest::TempDir dir_;
-};
-
-using Paths = std::vector<std::string>;
-
-TEST_F(Discovery, EachKindGoesToItsHostAndNestedPluginsAreNeverFound) {
-  std::string root = dir_ / "Printers";
-  printerModule(root + "/A.plugin");
-  printerModule(root + "/A.plugin/Contents/PlugIns/B.plugin");
-  writePluginBundle(root + "/Vendor/IO.plugin",
-                    {{QR_PM_TYPE_ID, {kFactory1}}, {QR_IOM_TYPE_ID, {kFactory2}}});
-  writePluginBundle(root + "/Vendor/Browser.plugin", {{QR_PBM_TYPE_ID, {kFactory1}}});
-  qrtest::writeText(root + "/Thing.plugin/readme.txt", "not a plug-in");
-  printerModule(root + "/Thing.plugin/Inner.plugin");
-  qrtest::writeText(root + "/File.plugin", "a plain file");
-  settings({root});
-  Found f = discover();
-  EXPECT_EQ(f.pm, Paths{root + "/A.plugin"});
-  EXPECT_EQ(f.iom, Paths{root + "/Vendor/IO.plugin"}) << "an I/O factory wins over a printer one";
-  EXPECT_EQ(f.pbm, Paths{root + "/Vendor/Browser.plugin"});
-}
-
-TEST_F(Discovery, DiscoveryNeedsTheExactWordYES) {
-  printerModule(dir_ / "P/A.plugin");
-  settings({dir_ / "P"});
-  support("yes");
-  EXPECT_TRUE(discover().pm.empty());
   forgetDiscoverySettings();
-  support("YES");
-  EXPECT_EQ(discover().pm.size(), 1u);
-}
-
-TEST_F(Discovery, ExclusionsCompareWholePathsAndPatternsMatchAcrossSlashes) {
-  std::string root = dir_ / "Printers";
-  printerModule(root + "/Foo/A.plugin");
-  printerModule(root + "/Foobar/B.plugin");
-  printerModule(root + "/Old/C.plugin");
-  printerModule(root + "/Vendor/Old/Deep/D.plugin");
-  printerModule(root + "/Older/E.plugin");
-  settings({root}, {root + "/Foo"}, {"*/Old/*"});
-  EXPECT_EQ(discover().pm, (Paths{root + "/Foobar/B.plugin", root + "/Older/E.plugin"}));
-
-  // A search root spelled with a trailing slash is not the excluded path.
-  forgetDiscoverySettings();
-  settings({root + "/Foo/"}, {root + "/Foo"});
-  EXPECT_EQ(discover().pm, Paths{root + "/Foo/A.plugin"});
-}
-
-TEST_F(Discovery, TheDepthLimitSkipsDirectoriesAtMaxLevel) {
-  std::string root = dir_ / "R";
-  printerModule(root + "/One.plugin");        // depth 1
-  printerModule(root + "/a/Two.plugin");      // depth 2
-  printerModule(root + "/a/b/Three.plugin");  // depth 3
-  settings({root});
-  EXPECT_EQ(discover(2).pm, Paths{root + "/One.plugin"});
-  forgetDiscoverySettings();
-  EXPECT_EQ(discover(3).pm.size(), 2u);
-  forgetDiscoverySettings();
-  printerModule(dir_ / "Root.plugin");
-  settings({dir_ / "Root.plugin"});
-  EXPECT_EQ(discover().pm, Paths{dir_ / "Root.plugin"}) << "a search root can itself be a plug-in";
-}
-
-TEST_F(Discovery, LinksAreFollowedLoopsEndAndMissingRootsAreSkipped) {
-  std::string root = dir_ / "Printers";
-  std::string elsewhere = dir_ / "Elsewhere/Real.plugin";
-  printerModule(elsewhere);
-  std::filesystem::create_directories(root);
-  std::filesystem::create_directory_symlink(elsewhere, root + "/Linked.plugin");
-  std::filesystem::create_directory_symlink(root, root + "/loop");
-  printerModule(root + "/Here.plugin");
-  settings({dir_ / "missing", root});
-  Found f = discover();
-  EXPECT_EQ(f.pm, (Paths{root + "/Here.plugin", root + "/Linked.plugin"}))
-      << "registered under the link's path, each once";
-}
-
-TEST_F(Discovery, AnUnreadableDirectoryEndsOnlyItsOwnBranch) {
-  if (geteuid() == 0) GTEST_SKIP() << "root reads every directory";
-  std::string root = dir_ / "Printers";
-  printerModule(root + "/Closed/A.plugin");
-  printerModule(root + "/Open/B.plugin");
-  std::filesystem::permissions(root + "/Closed", std::filesystem::perms::none);
-  settings({root});
-  EXPECT_EQ(discover().pm, Paths{root + "/Open/B.plugin"});
-  std::filesystem::permissions(root + "/Closed", std::filesystem::perms::owner_all);
-}
-
-TEST_F(Discovery, NoSettingsOrNoRootsMeansNoWalk) {
-  printerModule(dir_ / "P/A.plugin");
-  EXPECT_TRUE(discover().pm.empty()) << "no framework resource";
-  forgetDiscoverySettings();
-  settings({});
-  EXPECT_TRUE(discover().pm.empty());
-  ASSERT_TRUE(moduleSearchSettings());
 }
 
 }  // namespace
