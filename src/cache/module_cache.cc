@@ -1,5 +1,7 @@
 #include "cache/module_cache.h"
 
+#include <initializer_list>
+
 #include "bundles/bundle.h"
 #include "platform/file_io.h"
 #include "platform/locations.h"
@@ -26,6 +28,19 @@ Ref<Object> loadDefaultCacheResource() {
   auto value = readPropertyListFile(*path);
   if (!value || value->kind() != TypeKind::Dictionary) return nullptr;
   return value;
+}
+
+// A value the store cannot carry would make the whole store unwritable, so
+// the answer holding it is left out instead.
+bool storable(std::initializer_list<const Object*> values) {
+  for (const Object* value : values)
+    if (value && !canWriteXMLPropertyList(*value)) return false;
+  return true;
+}
+
+void logUnstorable(const URL* module, const String* connection) {
+  log("Not caching the answer of %@ for %@: it holds a value the store cannot carry", module,
+      connection);
 }
 
 String* stringValue(Object* value) {
@@ -124,10 +139,15 @@ void QuarrinModuleCache::addInfo(const Array* info, const URL* forPrinterModule,
   if (!forPrinterModule) return;
   Ref<MutableArray> value = info ? browserInfo(*info) : nullptr;
   if (!value) value = make<MutableArray>();
+  Ref<String> version = andConnection ? bundleShortVersion(forPrinterModule) : nullptr;
+  if (!storable({cacheKey(forPrinterModule).get(), andConnection, value.get(), version.get()})) {
+    logUnstorable(forPrinterModule, andConnection);
+    return;
+  }
   MutableDictionary& entry = entryFor(*forPrinterModule);
   if (andConnection) {
     entry.set(Ref<Object>(andConnection->copy()), value);
-    if (auto version = bundleShortVersion(forPrinterModule))
+    if (version)
       entry.set(kBundleVersionKey, version);
     else
       entry.remove(kBundleVersionKey);  // never current without a version
@@ -147,8 +167,13 @@ Ref<MutableArray> QuarrinModuleCache::getInfoForPrinterModule(const URL* module,
 void QuarrinModuleCache::addInfoForIOModule(const URL* module, const String* toConnection,
                                             const String* andBrowser) {
   if (!module) return;
+  Ref<String> version = bundleShortVersion(module);
+  if (!storable({cacheKey(module).get(), toConnection, andBrowser, version.get()})) {
+    logUnstorable(module, toConnection);
+    return;
+  }
   MutableDictionary& entry = entryFor(*module);
-  if (auto version = bundleShortVersion(module))
+  if (version)
     entry.set(kBundleVersionKey, version);
   else
     entry.remove(kBundleVersionKey);
@@ -168,7 +193,7 @@ bool QuarrinModuleCache::getInfoForIOModule(const URL* module, Ref<String>* conn
 
 bool QuarrinModuleCache::writeCache() {
   if (!dirty_) return false;
-  setPrintingPref(*String::make(kCachePrefKey), cacheDict(), kCachePrefDomain);
+  if (!setPrintingPref(*String::make(kCachePrefKey), cacheDict(), kCachePrefDomain)) return false;
   dirty_ = false;
   return true;
 }

@@ -38,6 +38,7 @@ class QuarrinModuleCache final : public Object {
   bool getInfoForIOModule(const URL* module, Ref<String>* connection, Ref<String>* browser);
 
   // Stores the dictionary under "pmcache 5" when it changed; true when it did.
+  // False with the cache still dirty: the store could not be written (logged).
   bool writeCache();
   // Writes the dictionary to fd as an XML property list; true when every byte went out.
   bool writeToFd(int fd);

@@ -84,8 +84,8 @@ Ref<String> deviceNameOf(View<C> text) {
   if (model) return toString(*model);
   if (make) return toString(*make);
   if (auto description = search(text, orders().description)) return toString(*description);
-  static const Ref<String> unknown = String::make("Unknown");
-  return unknown;
+  static String* const unknown = immortal(String::make("Unknown").leak());
+  return Ref<String>(unknown);
 }
 
 template <class C>

@@ -9,12 +9,20 @@ LookupInfoItem::LookupInfoItem(const URL* pm, const Dictionary* lookupInfo) {
   setLookupInfo(lookupInfo);
 }
 
+LookupInfoItem::~LookupInfoItem() {
+  retain();  // keeps the count off zero while the dictionary lets go of the item
+  detach();
+}
+
 void LookupInfoItem::setLookupInfo(const Dictionary* info) {
-  if (lookupInfo_) detach();
+  detach();
   lookupInfo_.reset();
   if (!info) return;
   lookupInfo_ = info->mutableCopy();
   lookupInfo_->set(kLookupReferenceKey, Ref<Object>(this));
+  // The item's own dictionary refers back without counting: counted, the two
+  // would keep each other alive for good. Copies handed out do count.
+  release();
 }
 
 Ref<Dictionary> LookupInfoItem::copyLookupInfoDict() const {
@@ -26,15 +34,9 @@ Object* LookupInfoItem::getIcon() const {
 }
 
 void LookupInfoItem::detach() {
-  if (lookupInfo_) lookupInfo_->remove(kLookupReferenceKey);
-}
-
-LookupInfoList::~LookupInfoList() {
-  // Items and their dictionaries hold each other; copies handed out keep their
-  // own references to the items, so only the list's share of the cycle goes.
-  if (!lookupList_) return;
-  for (const auto& item : *lookupList_)
-    if (auto* lookup = cast<LookupInfoItem>(item.get())) lookup->detach();
+  if (!lookupInfo_ || lookupInfo_->get(kLookupReferenceKey) != this) return;
+  retain();  // what the dictionary gives back on removal was never counted
+  lookupInfo_->remove(kLookupReferenceKey);
 }
 
 LookupInfoItem* LookupInfoList::getItemAtIndex(uint32_t index) const {

@@ -17,10 +17,12 @@ namespace qr {
 class LookupInfoItem final : public LookupReference {
  public:
   LookupInfoItem(const URL* pm, const Dictionary* lookupInfo);  // initWithPM:lookupInfo:
+  ~LookupInfoItem() override;
 
   const Ref<URL>& pmURL() const noexcept { return pmURL_; }
   void setPMURL(Ref<URL> url) { pmURL_ = std::move(url); }
-  // The item's own mutable dictionary, not a copy.
+  // The item's own mutable dictionary, not a copy. Its back-reference to the
+  // item is not counted: leave that key as it is.
   MutableDictionary* lookupInfo() const noexcept { return lookupInfo_.get(); }
   // Stores a shallow mutable copy of info with the back-reference set to this item.
   void setLookupInfo(const Dictionary* info);
@@ -28,12 +30,12 @@ class LookupInfoItem final : public LookupReference {
   Ref<Dictionary> copyLookupInfoDict() const;
   // "Printer Browser Icons" of the entry, or null.
   Object* getIcon() const;
-  // Breaks the item <-> dictionary cycle once the item's list is gone.
-  void detach();
-
   Dictionary* referencedLookupInfo() const override { return lookupInfo_.get(); }
 
  private:
+  // Takes the uncounted back-reference out of the item's own dictionary.
+  void detach();
+
   Ref<URL> pmURL_;
   Ref<MutableDictionary> lookupInfo_;
 };
@@ -42,7 +44,6 @@ class LookupInfoList final : public Object {
  public:
   explicit LookupInfoList(Ref<String> connectionType)  // initWithConnectionType:
       : connectionType_(std::move(connectionType)), lookupList_(make<MutableArray>()) {}
-  ~LookupInfoList() override;
 
   const Ref<String>& connectionType() const noexcept { return connectionType_; }
   void setConnectionType(Ref<String> type) { connectionType_ = std::move(type); }

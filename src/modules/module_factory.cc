@@ -15,7 +15,7 @@ namespace {
 
 int32_t gLoadFailures = 0;
 
-UUID* keptUUID(const char* text) { return UUID::fromString(text).leak(); }
+UUID* keptUUID(const char* text) { return immortal(UUID::fromString(text).leak()); }
 
 template <class Module>
 Ref<QuarrinModule> makeIfDeclared(PlugIn& plugin, UUID* type, const Ref<URL>& url) {

@@ -5,7 +5,8 @@
 
 namespace qr {
 
-// CACHEWRIGHT_FRAMEWORK (ignored in a privileged context), else the build's default.
+// CACHEWRIGHT_FRAMEWORK, else the build's default. Like CACHEWRIGHT_PREFS, the
+// variable is ignored only in set-user-ID or set-group-ID runs.
 std::string frameworkBundlePath();
 
 }  // namespace qr

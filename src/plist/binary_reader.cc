@@ -70,7 +70,8 @@ class BinaryReader {
   // What is known of one object; a finished immutable object is kept here for sharing.
   struct Slot {
     Ref<Object> value;
-    uint64_t treeSize = 0;  // nodes the value has when walked as a tree
+    uint64_t treeSize = 0;   // nodes the value has when walked as a tree
+    uint64_t treeBytes = 0;  // string and data bytes it has when walked as a tree
     uint16_t height = 0;
     State state = kUnseen;
   };
@@ -189,6 +190,9 @@ class BinaryReader {
     s.value = leaf(h);
     if (!s.value) return nullptr;
     s.treeSize = 1;
+    s.treeBytes = h.type == kUTF16String                      ? 2 * h.count
+                  : h.type == kData || h.type == kASCIIString ? h.count
+                                                              : 0;
     s.height = 1;
     s.state = kDone;
     return s.value;
@@ -240,9 +244,17 @@ class BinaryReader {
     return d;
   }
 
+  // The bytes of a dictionary's keys, once container() has read them.
+  uint64_t keyBytes(const Header& h) const {
+    uint64_t bytes = 0;
+    for (uint64_t i = 0; i < h.count; ++i)
+      bytes = std::min(bytes + slots_[reference(h, i)].treeBytes, payloadBudget_ + 1);
+    return bytes;
+  }
+
   // Immutable results: each object once, shared by every reference to it. The
-  // size of the value as a tree is still bounded, since copying, comparing or
-  // writing it walks it as one.
+  // size of the value as a tree, in nodes and in bytes, is still bounded, since
+  // copying, comparing or writing it walks it as one.
   Ref<Object> shared(uint64_t index, size_t depth) {
     if (depth > kMaxPropertyListDepth) return nullptr;
     Slot& s = slots_[index];
@@ -253,18 +265,22 @@ class BinaryReader {
     if (!isContainer(h.type)) return sharedLeaf(index, h);
     s.state = kBusy;
     uint64_t size = 1 + (h.type == kDictionary ? h.count : 0);
+    uint64_t bytes = 0;
     size_t height = 1;
     auto v = container(h, depth, [&](uint64_t child, size_t d) {
       auto c = shared(child, d);
       if (c) {
         size = std::min(size + slots_[child].treeSize, nodeBudget_ + 1);
+        bytes = std::min(bytes + slots_[child].treeBytes, payloadBudget_ + 1);
         height = std::max<size_t>(height, slots_[child].height + 1);
       }
       return c;
     });
-    if (!v || size > nodeBudget_) return nullptr;
+    if (v && h.type == kDictionary) bytes = std::min(bytes + keyBytes(h), payloadBudget_ + 1);
+    if (!v || size > nodeBudget_ || bytes > payloadBudget_) return nullptr;
     s.value = std::move(v);
     s.treeSize = size;
+    s.treeBytes = bytes;
     s.height = static_cast<uint16_t>(height);
     s.state = kDone;
     return s.value;
@@ -279,7 +295,8 @@ class BinaryReader {
     if (!header(index, h)) return nullptr;
     if (!isContainer(h.type)) {
       auto v = sharedLeaf(index, h);
-      if (!v || mutability_ != Mutability::MutableContainersAndLeaves) return v;
+      if (!v || !chargePayload(slots_[index].treeBytes)) return nullptr;
+      if (mutability_ != Mutability::MutableContainersAndLeaves) return v;
       return mutableLeaf(*v);
     }
     Slot& s = slots_[index];
@@ -291,18 +308,14 @@ class BinaryReader {
     s.state = kBusy;
     auto v = container(h, depth, [&](uint64_t child, size_t d) { return fresh(child, d); });
     s.state = kUnseen;
+    if (v && h.type == kDictionary && !chargePayload(keyBytes(h))) return nullptr;
     return v;
   }
 
   Ref<Object> mutableLeaf(Object& v) {
-    if (v.kind() == TypeKind::String) {
-      auto& s = static_cast<String&>(v);
-      if (!chargePayload(s.length())) return nullptr;
-      return s.mutableCopy();
-    }
+    if (v.kind() == TypeKind::String) return static_cast<String&>(v).mutableCopy();
     if (v.kind() == TypeKind::Data) {
       auto& d = static_cast<Data&>(v);
-      if (!chargePayload(d.length())) return nullptr;
       return make<MutableData>(std::vector<uint8_t>(d.bytes(), d.bytes() + d.length()));
     }
     return Ref<Object>(&v);  // numbers, booleans and dates are immutable in every kind

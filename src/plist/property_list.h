@@ -31,6 +31,8 @@ Ref<Object> readTextPropertyList(std::string_view bytes, Mutability mutability);
 // The canonical XML form; none when the value holds anything that is not a
 // property-list value or a string that XML 1.0 cannot carry.
 std::optional<std::string> writeXMLPropertyList(const Object& value);
+// Whether writeXMLPropertyList would write the value, without writing it.
+bool canWriteXMLPropertyList(const Object& value);
 // Writes the XML form to a file in place (not atomically). False on any failure.
 bool writePropertyListFile(const Object& value, const std::string& path);
 

@@ -321,6 +321,11 @@ void adviseHugePages(char* p, size_t n) noexcept {
 
 }  // namespace
 
+bool canWriteXMLPropertyList(const Object& value) {
+  Counter counter;
+  return Walker<Counter>(counter).value(value, 1);
+}
+
 std::optional<std::string> writeXMLPropertyList(const Object& value) {
   try {
     Counter counter;

@@ -268,21 +268,21 @@ Ref<MutableDictionary> copyDictionaryPrintingPref(const String& key, int /*domai
   return cast<MutableDictionary>(deepCopy(*value, Mutability::MutableContainersAndLeaves));
 }
 
-void setPrintingPref(const String& key, const Object& value, int /*domain*/) {
+bool setPrintingPref(const String& key, const Object& value, int /*domain*/) {
   std::string store = prefsStorePath();
   Ref<Object> stored = deepCopy(value, Mutability::Immutable);
   if (!stored) {
     log("Printing preference %@ not stored in %s: the value is not a property list", &key, store);
-    return;
+    return false;
   }
   std::string dir = directoryOf(store);
   if (!makeDirectories(dir)) {
     log("Cannot create the directory %s of the printing-preferences store: %s", dir,
         errorText(errno));
-    return;
+    return false;
   }
   StoreLock lock(store);
-  if (!lock.held()) return;
+  if (!lock.held()) return false;
   removeStaleTemporaries(store);
 
   StoreContents current = readStore(store);
@@ -292,10 +292,10 @@ void setPrintingPref(const String& key, const Object& value, int /*domain*/) {
       // Replacing a store that could not be read would lose what it holds.
       log("Printing preference %@ not stored: cannot read %s: %s", &key, store,
           errorText(current.error));
-      return;
+      return false;
     case StoreContents::Status::Corrupt: {
       std::string kept = store + ".corrupt";
-      if (!replaceFile(kept, current.bytes, kStoreMode)) return;
+      if (!replaceFile(kept, current.bytes, kStoreMode)) return false;
       log("The unreadable printing-preferences store %s is kept as %s", store, kept);
       dictionary = make<MutableDictionary>();
       break;
@@ -311,12 +311,12 @@ void setPrintingPref(const String& key, const Object& value, int /*domain*/) {
   std::optional<std::string> xml = writeXMLPropertyList(*dictionary);
   if (!xml) {
     log("Printing preference %@ not stored: cannot write %s as a property list", &key, store);
-    return;
+    return false;
   }
   // A store that already holds exactly these bytes is left as it is: a
   // rewrite would change nothing but cost a sync of the whole file.
-  if (current.status == StoreContents::Status::Parsed && *xml == current.bytes) return;
-  replaceFile(store, *xml, existingModeOr(store, kStoreMode));
+  if (current.status == StoreContents::Status::Parsed && *xml == current.bytes) return true;
+  return replaceFile(store, *xml, existingModeOr(store, kStoreMode));
 }
 
 }  // namespace qr

@@ -12,8 +12,9 @@
 
 namespace qr {
 
-// The store's path: CACHEWRIGHT_PREFS (ignored in a privileged context), else
-// the build's default.
+// The store's path: CACHEWRIGHT_PREFS, else the build's default. The variable
+// is ignored only in set-user-ID or set-group-ID runs (secure_getenv); a run
+// as root takes it, since root's environment is root's own choice.
 std::string prefsStorePath();
 
 // A new string the caller owns, or null when the key holds no string.
@@ -21,7 +22,8 @@ Ref<String> copyStringPrintingPref(const String& key, int domain);
 // A new dictionary, mutable down to its leaves, that the caller owns; null when
 // the key holds no dictionary.
 Ref<MutableDictionary> copyDictionaryPrintingPref(const String& key, int domain);
-// Stores a property-list value under the key; failures are logged.
-void setPrintingPref(const String& key, const Object& value, int domain);
+// Stores a property-list value under the key. False, with one log line, when
+// the store could not be written.
+bool setPrintingPref(const String& key, const Object& value, int domain);
 
 }  // namespace qr

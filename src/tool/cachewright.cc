@@ -76,7 +76,9 @@ int runCachewright(int argc, char** argv) {
       status = 1;
     }
   } else {
-    status = QuarrinModuleCache::defaultCache().writeCache() ? 1 : 0;
+    QuarrinModuleCache& cache = QuarrinModuleCache::defaultCache();
+    // 1 says the cache was stored, so a store that failed must not end with it.
+    status = cache.writeCache() ? 1 : cache.dirty() ? 2 : 0;
   }
 
   if (isPathMode(argc, argv) && String::fromUTF8(argv[1])) status = writeCacheFile(argv[1]) ? 0 : 1;

@@ -32,10 +32,16 @@ class Object {
   Object& operator=(const Object&) = delete;
   virtual ~Object() = default;
 
-  void retain() const noexcept { refs_.fetch_add(1, std::memory_order_relaxed); }
-  void release() const noexcept {
-    if (refs_.fetch_sub(1, std::memory_order_acq_rel) == 1) dispose();
+  void retain() const noexcept {
+    if (!isImmortal()) refs_.fetch_add(1, std::memory_order_relaxed);
   }
+  void release() const noexcept {
+    if (!isImmortal() && refs_.fetch_sub(1, std::memory_order_acq_rel) == 1) dispose();
+  }
+  // For values shared by the whole process: from now on retains and releases
+  // do not count, so a plug-in that releases one too often cannot free it.
+  // Call it before the object is shared.
+  void makeImmortal() const noexcept { refs_.store(kImmortal, std::memory_order_relaxed); }
   uint32_t retainCount() const noexcept { return refs_.load(std::memory_order_relaxed); }
 
   virtual TypeKind kind() const noexcept { return TypeKind::Other; }
@@ -51,6 +57,9 @@ class Object {
   virtual void dispose() const noexcept { delete this; }
 
  private:
+  static constexpr uint32_t kImmortal = UINT32_MAX;
+  bool isImmortal() const noexcept { return refs_.load(std::memory_order_relaxed) == kImmortal; }
+
   mutable std::atomic<uint32_t> refs_{1};
 };
 
@@ -131,6 +140,12 @@ inline bool equal(const Object* a, const Object* b) noexcept {
 template <class T, class U>
 bool equal(const Ref<T>& a, const Ref<U>& b) noexcept {
   return equal(a.get(), b.get());
+}
+
+template <class T>
+T* immortal(T* object) noexcept {
+  object->makeImmortal();
+  return object;
 }
 
 // Object description with nil printed as "(null)".

@@ -100,12 +100,12 @@ std::string Number::description() const {
 }
 
 Ref<Boolean> Boolean::trueValue() {
-  static Boolean* const value = new Boolean(true);
+  static Boolean* const value = immortal(new Boolean(true));
   return Ref<Boolean>(value);
 }
 
 Ref<Boolean> Boolean::falseValue() {
-  static Boolean* const value = new Boolean(false);
+  static Boolean* const value = immortal(new Boolean(false));
   return Ref<Boolean>(value);
 }
 

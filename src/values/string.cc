@@ -135,18 +135,6 @@ void encodeUTF8(std::u16string_view units, std::string& out) {
   }
 }
 
-size_t hashCodeUnits(std::string_view narrow) noexcept {
-  uint64_t h = 1469598103934665603ull;
-  for (unsigned char c : narrow) h = (h ^ c) * 1099511628211ull;
-  return static_cast<size_t>(h ^ (h >> 29));
-}
-
-size_t hashCodeUnits(std::u16string_view wide) noexcept {
-  uint64_t h = 1469598103934665603ull;
-  for (char16_t c : wide) h = (h ^ c) * 1099511628211ull;
-  return static_cast<size_t>(h ^ (h >> 29));
-}
-
 Ref<String> String::fromUTF8(std::string_view utf8) {
   if (isASCII(utf8)) return StoredString::create(utf8.data(), utf8.size(), false);
   std::u16string units;
@@ -183,7 +171,7 @@ Ref<String> String::make(std::string_view utf8) {
 }
 
 Ref<String> String::empty() {
-  static String* const shared = [] { return StoredString::create("", 0, false).leak(); }();
+  static String* const shared = immortal(StoredString::create("", 0, false).leak());
   return Ref<String>(shared);
 }
 
