@@ -1,7 +1,8 @@
 // Reading and writing property lists. Readers take XML, binary "bplist00" and
 // the old text format (the one .strings tables use); every reader bounds its
 // nesting, checks every offset and count against the input, and gives null
-// for anything it cannot read. The writer writes one canonical XML form.
+// for anything it cannot read. The writers write one canonical XML form and
+// the binary form.
 #pragma once
 
 #include <optional>
@@ -33,6 +34,8 @@ Ref<Object> readTextPropertyList(std::string_view bytes, Mutability mutability);
 std::optional<std::string> writeXMLPropertyList(const Object& value);
 // Whether writeXMLPropertyList would write the value, without writing it.
 bool canWriteXMLPropertyList(const Object& value);
+// The binary "bplist00" form; none when the value holds anything that is not a property-list value.
+std::optional<std::string> writeBinaryPropertyList(const Object& value);
 // Writes the XML form to a file in place (not atomically). False on any failure.
 bool writePropertyListFile(const Object& value, const std::string& path);
 

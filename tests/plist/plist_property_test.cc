@@ -137,25 +137,31 @@ TEST(PropertyList, RandomTreesSurviveEveryCopyEveryReaderAndPlistlib) {
       EXPECT_TRUE(equal(copy, tree) && equal(tree, copy));
     }
     std::string xml = writeXMLPropertyList(*tree).value();
+    std::string bin = writeBinaryPropertyList(*tree).value();
     expectRead(xml, PropertyListFormat::XML, tree, g.nan, true);
+    expectRead(bin, PropertyListFormat::Binary, tree, g.nan);
     expectRead(toText(*strings, t), PropertyListFormat::Text, strings, false);
-    if (seed % 3 == 0) forPython.emplace_back(tree, g.nan), docs += xml + '\0';
+    if (seed % 3 != 0) continue;
+    forPython.emplace_back(tree, g.nan);
+    for (auto* doc : {&xml, &bin}) docs += std::to_string(doc->size()) + '\n' + *doc;
   }
-  // plistlib reads each document we write and writes it again as XML and binary.
+  // plistlib reads each document we write (XML and binary) and writes it again as both.
   if (std::system("python3 -c 'import plistlib' 2>/dev/null") != 0) GTEST_SKIP() << "no python3";
   const char kProgram[] = R"(import plistlib as p, sys
 sys.setrecursionlimit(10000)
-for doc in sys.stdin.buffer.read().split(b'\0')[:-1]:
-  for out in (p.dumps(p.loads(doc), fmt=f) for f in (p.FMT_XML, p.FMT_BINARY)):
+d, i = sys.stdin.buffer.read(), 0
+while i < len(d):
+  j = d.index(b'\n', i) + 1; i = j + int(d[i:j])
+  for out in (p.dumps(p.loads(d[j:i]), fmt=f) for f in (p.FMT_XML, p.FMT_BINARY)):
     sys.stdout.buffer.write(b'%d\n' % len(out) + out))";
   TempDir dir;
   std::string run = "python3 " + dir.write("p", kProgram) + " <" + dir.write("in", docs) + " >";
   ASSERT_EQ(std::system((run + dir / "out").c_str()), 0);
   std::string out = readText(dir / "out");
   size_t at = 0;
-  for (size_t i = 0; i < 2 * forPython.size(); ++i) {
+  for (size_t i = 0; i < 4 * forPython.size(); ++i) {
     size_t line = out.find('\n', at), n = std::stoul(out.substr(at, line - at));
-    auto& [tree, nan] = forPython[i / 2];
+    auto& [tree, nan] = forPython[i / 4];
     expectRead(out.substr(line + 1, n),
                i % 2 ? PropertyListFormat::Binary : PropertyListFormat::XML, tree, nan);
     at = line + 1 + n;

@@ -7,6 +7,7 @@
 #include "plist/property_list.h"
 #include "support/plist_identity.h"
 #include "values/url.h"
+#include "values/uuid.h"
 
 using namespace qr;
 using namespace qrtest;
@@ -197,6 +198,7 @@ TEST(PropertyList, OnlyPropertyListsThatReadBackAreWritten) {
       // clang-format off
       {highLast, true, false}, {URL::fileURL("/", true), false, false}, {numberKeyed, false, false},
 {A({make<Object>()}), false, false}, {A({deepest}), false, false},
+      {make<UUID>(UUID::Bytes{}), false, false},
       {deepest, true, true}, {D({{"tab\x01", I(1)}}), true, false}, {S("nul \0"sv), true, false},
       {S("\xEF\xBF\xBE"), true, false}, {String::fromUTF16(u"\xDC00 low"), true, false},
       {String::fromUTF16(u"\xD800\xD800"), true, false}, {make<Date>(NAN), true, false},
@@ -210,6 +212,11 @@ TEST(PropertyList, OnlyPropertyListsThatReadBackAreWritten) {
     for (auto m : kAllMutabilities) EXPECT_EQ(bool(deepCopy(*v, m)), plist) << describe(v.get());
     EXPECT_EQ(bool(writeXMLPropertyList(*v)), written) << describe(v.get());
     EXPECT_EQ(bool(writeXMLPropertyList(*D({{"k", A({v})}}))), written && v != deepest);
+    // The binary form carries every property list, and reads back to the same bytes.
+    auto bin = writeBinaryPropertyList(*v);
+    auto back = bin ? readBinaryPropertyList(*bin, Mutability::Immutable) : nullptr;
+    EXPECT_TRUE(bool(bin) == plist && (!bin || (back && writeBinaryPropertyList(*back) == bin)));
+    EXPECT_EQ(bool(writeBinaryPropertyList(*D({{"k", A({v})}}))), plist && v != deepest);
   }
 }
 
