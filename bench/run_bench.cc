@@ -3,6 +3,11 @@
 // with its own Info dictionary, version and browser info) and 4 I/O modules:
 //
 //   cold   cachewright in path mode: an empty cache, every module loaded and asked
+//          in the helper process, as every run does
+//   inproc the same cold run with every plug-in called in the run's own
+//          process, the way runs worked before the helper; both this and
+//          "cold*" beside it are a forked copy of this program calling the
+//          run, so that program start does not blur the comparison
 //   warm   cachewright in default mode with every cache entry current: nothing loaded
 //   floor  reading and parsing every bundle's Info dictionary once, in this
 //          process: what a warm run, which must check every bundle's version,
@@ -32,6 +37,7 @@
 
 #include "platform/file_io.h"
 #include "plist/property_list.h"
+#include "tool/cachewright.h"
 #include "values/dictionary.h"
 
 #if !defined(QUARRIN_CACHEWRIGHT) || !defined(QUARRIN_SAMPLE_PRINTER_MODULE) || \
@@ -180,6 +186,25 @@ int runCachewright(const std::vector<std::string>& args, const std::string& errP
   return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
 }
 
+// The run in a forked copy of this program, plug-ins in a helper or not.
+int runForked(const std::vector<std::string>& args, bool isolate, const std::string& errPath) {
+  pid_t pid = fork();
+  if (pid == 0) {
+    int null = open("/dev/null", O_RDWR);
+    int err = open(errPath.c_str(), O_WRONLY | O_CREAT | O_APPEND, 0644);
+    dup2(null, 0);
+    dup2(null, 1);
+    dup2(err, 2);
+    std::vector<char*> argv{const_cast<char*>("cachewright")};
+    for (const auto& a : args) argv.push_back(const_cast<char*>(a.c_str()));
+    argv.push_back(nullptr);
+    _exit(qr::runCachewright(int(argv.size()) - 1, argv.data(), isolate));
+  }
+  int status = 0;
+  if (pid < 0 || waitpid(pid, &status, 0) != pid) return -1;
+  return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+}
+
 double median(std::vector<double> v) {
   std::sort(v.begin(), v.end());
   return v.size() % 2 ? v[v.size() / 2] : (v[v.size() / 2 - 1] + v[v.size() / 2]) / 2;
@@ -223,6 +248,9 @@ void measure(int n) {
   setenv("CACHEWRIGHT_FRAMEWORK", (root + "/Zephrin.framework").c_str(), 1);
   setenv("CACHEWRIGHT_PREFS", store.c_str(), 1);
   setenv("QUARRIN_SAMPLE_TRACE", trace.c_str(), 1);
+  std::string program = QUARRIN_CACHEWRIGHT;
+  setenv("CACHEWRIGHT_SCANNER",
+         (program.substr(0, program.rfind('/') + 1) + "cachewright-scanner").c_str(), 1);
   const int runs = n >= 5000 ? 3 : 5;
 
   writeStore(store, false);
@@ -237,6 +265,15 @@ void measure(int n) {
   auto cache = qr::cast<qr::Dictionary>(qr::readPropertyListFile(cacheFile));
   if (!cache || cache->count() != size_t(n) + 4)
     fail("the cold run's cache does not hold one entry per module");
+  Times forked = medianOf(runs, childrenCPU, [&] {
+    if (runForked({cacheFile}, true, errors) != 0) fail("a forked cold run did not write its file");
+  });
+  Times inProcess = medianOf(runs, childrenCPU, [&] {
+    if (runForked({cacheFile}, false, errors) != 0)
+      fail("an in-process run did not write its file");
+  });
+  auto same = qr::readPropertyListFile(cacheFile);
+  if (!same || !same->isEqual(*cache)) fail("the in-process run's cache differs");
 
   fs::remove(trace);
   Times warm = medianOf(runs, childrenCPU, [&] {
@@ -251,10 +288,11 @@ void measure(int n) {
   });
 
   for (auto [what, pick] : {std::pair{"wall", &Times::wall}, std::pair{"cpu", &Times::cpu}})
-    std::printf("%6d %-4s %8.1f %9.1f %9.1f %9.1f %8.2f %9.1f %9.1f %9.1f\n", n, what,
-                start.*pick * 1e3, cold.*pick * 1e3, warm.*pick * 1e3, floor.*pick * 1e3,
+    std::printf("%6d %-4s %8.1f %9.1f %9.1f %9.1f %8.2f %9.1f %9.1f %9.1f %9.1f %9.1f %8.2f\n", n,
+                what, start.*pick * 1e3, cold.*pick * 1e3, warm.*pick * 1e3, floor.*pick * 1e3,
                 warm.*pick / (floor.*pick), cold.*pick / n * 1e6, warm.*pick / n * 1e6,
-                floor.*pick / n * 1e6);
+                floor.*pick / n * 1e6, forked.*pick * 1e3, inProcess.*pick * 1e3,
+                forked.*pick / (inProcess.*pick));
   std::fflush(stdout);
   if (!getenv("KEEPROOT"))
     fs::remove_all(root);
@@ -268,8 +306,9 @@ int main(int argc, char** argv) {
   std::vector<int> sizes;
   for (int i = 1; i < argc; ++i) sizes.push_back(std::atoi(argv[i]));
   if (sizes.empty()) sizes = {100, 1000, 5000};
-  std::printf("%6s %-4s %8s %9s %9s %9s %8s %9s %9s %9s\n", "N", "time", "start ms", "cold ms",
-              "warm ms", "floor ms", "warm/flr", "cold us/N", "warm us/N", "flr us/N");
+  std::printf("%6s %-4s %8s %9s %9s %9s %8s %9s %9s %9s %9s %9s %8s\n", "N", "time", "start ms",
+              "cold ms", "warm ms", "floor ms", "warm/flr", "cold us/N", "warm us/N", "flr us/N",
+              "cold* ms", "inproc ms", "cold*/in");
   for (int n : sizes) measure(n);
   return 0;
 }

@@ -96,6 +96,14 @@ else
 fi
 
 echo
+echo "BrokenExample.plugin is the example of a broken plug-in: it crashed in the helper"
+echo "process that makes every call into plug-in code, so the run logged one line and"
+echo "carried on. The modules with answers in the cache file:"
+sed -n 's|^\t<key>\(file://.*\)</key>$|    \1|p' "$cache_file" | shorten
+echo "The warm run skipped it: it is remembered under \"cachewright failures\" in the store"
+echo "until it is rebuilt or its version changes."
+
+echo
 echo "The cache written to \$WORK/cache.plist:"
 shorten <"$cache_file"
 

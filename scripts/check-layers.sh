@@ -4,7 +4,7 @@
 # store, images) need nothing of each other either.
 set -euo pipefail
 cd "$(dirname "$0")/.."
-order=(values platform plist bundles store images cache modules hosts deviceid tool)
+order=(values platform plist bundles store images cache modules scanner hosts deviceid tool)
 declare -A rank
 for i in "${!order[@]}"; do rank[${order[$i]}]=$i; done
 rank[store]=${rank[bundles]}

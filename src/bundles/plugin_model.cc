@@ -3,12 +3,14 @@
 
 #include <dlfcn.h>
 #include <quarrin/plugin.h>
+#include <unistd.h>
 
 #include <optional>
 #include <string>
 #include <vector>
 
 #include "bundles/c_bridge.h"
+#include "platform/file_trust.h"
 #include "platform/log.h"
 #include "values/dictionary.h"
 #include "values/string.h"
@@ -63,6 +65,14 @@ void* PlugIn::loadImage() {
       log("Plug-in %@ names no executable in its Info dictionary", url_);
       return;
     }
+    // Root runs only code that only root could have put there.
+    if (::geteuid() == 0) {
+      auto top = url_->fileSystemPath();
+      if (auto problem = rootTrustProblem(top ? *top : *path, *path)) {
+        log("Refusing to load '%s': %s", problem->path, problem->reason);
+        return;
+      }
+    }
     // Never closed: the process may hold interfaces into the image until it ends.
     image_ = dlopen(path->c_str(), RTLD_NOW | RTLD_LOCAL);
     if (!image_) {
@@ -73,7 +83,8 @@ void* PlugIn::loadImage() {
   return image_;
 }
 
-void* PlugIn::createInstance(const UUID& factoryID, const UUID& typeID) {
+void* PlugIn::createInstance(const UUID& factoryID, const UUID& typeID,
+                             const std::function<void()>& beforeFactory) {
   auto* function =
       dynamic_cast<String*>(valueForUUIDKey(bundle_->infoValue("CFPlugInFactories"), factoryID));
   if (!function) {
@@ -97,6 +108,7 @@ void* PlugIn::createInstance(const UUID& factoryID, const UUID& typeID) {
     return nullptr;
   }
   auto factory = reinterpret_cast<QrPlugInFactoryFunction>(symbol);
+  if (beforeFactory) beforeFactory();
   void* instance = factory(nullptr, toC<QrUUIDRef>(&typeID));
   if (!instance) log("Plug-in %@: factory '%s' made no instance of type %@", url_, name, &typeID);
   return instance;

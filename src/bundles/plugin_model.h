@@ -4,6 +4,7 @@
 // The shared object is opened on the first instance and never closed.
 #pragma once
 
+#include <functional>
 #include <mutex>
 #include <string>
 
@@ -29,8 +30,10 @@ class PlugIn final : public Object {
   // pointer whose first word points to the IUnknown-shaped table), or null
   // with one log line when the shared object or the function is missing, or
   // the factory returns NULL. The platform exception raised by the factory
-  // passes through to the caller.
-  void* createInstance(const UUID& factoryID, const UUID& typeID);
+  // passes through to the caller. beforeFactory runs once the function is
+  // found, just before it is called.
+  void* createInstance(const UUID& factoryID, const UUID& typeID,
+                       const std::function<void()>& beforeFactory = {});
 
  private:
   PlugIn(Ref<URL> url, Ref<Bundle> bundle);

@@ -191,6 +191,11 @@ bool QuarrinModuleCache::getInfoForIOModule(const URL* module, Ref<String>* conn
   return true;
 }
 
+void QuarrinModuleCache::removeEntry(const URL* module) {
+  auto key = cacheKey(module);
+  if (key && cacheDict().remove(*key)) dirty_ = true;
+}
+
 bool QuarrinModuleCache::writeCache() {
   if (!dirty_) return false;
   if (!setPrintingPref(*String::make(kCachePrefKey), cacheDict(), kCachePrefDomain)) return false;

@@ -37,6 +37,9 @@ class QuarrinModuleCache final : public Object {
   // True and the entry's values (each possibly null) when a current entry exists.
   bool getInfoForIOModule(const URL* module, Ref<String>* connection, Ref<String>* browser);
 
+  // Drops whatever is recorded for the module.
+  void removeEntry(const URL* module);
+
   // Stores the dictionary under "pmcache 5" when it changed; true when it did.
   // False with the cache still dirty: the store could not be written (logged).
   bool writeCache();

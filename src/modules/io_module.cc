@@ -2,8 +2,6 @@
 
 #include "cache/module_cache.h"
 #include "modules/module_factory.h"
-#include "modules/plugin_calls.h"
-#include "modules/plugin_guard.h"
 #include "platform/log.h"
 
 namespace qr {
@@ -25,8 +23,8 @@ void IOModule::connectionInfo() {
   Ref<String> type, path;
   auto& cache = QuarrinModuleCache::defaultCache();
   if (!cache.getInfoForIOModule(pluginURL().get(), &type, &path) && loadPluginInterface()) {
-    auto raised = guardPluginCall([&] {
-      int32_t status = plugin_calls::getConnectionInfo(pluginInterface(), &type, &path);
+    auto raised = callPlugin([&] {
+      int32_t status = runner().getConnectionInfo(interfaceHandle(), &type, &path);
       // A failed call records nothing, so the next run asks again.
       if (status == 0) cache.addInfoForIOModule(pluginURL().get(), type.get(), path.get());
     });

@@ -65,6 +65,10 @@ class PBMModule final : public QuarrinModule {
   // The host's lookup function: refCon is the module given to Initialize.
   static int32_t defaultGetLookupSpec(void* refCon, uint32_t index, QrDictionaryRef* lookupSpec);
 
+ protected:
+  // Browsers are hosted by library users in their own process.
+  PluginRunner& runner() const override { return PluginRunner::inProcess(); }
+
  private:
   const QrBrowserModuleVTbl* table() const noexcept {
     return interfaceLoaded() ? static_cast<const QrBrowserModuleVTbl*>(pluginInterface()) : nullptr;

@@ -4,8 +4,6 @@
 #include "images/image.h"
 #include "modules/lookup_reference.h"
 #include "modules/module_factory.h"
-#include "modules/plugin_calls.h"
-#include "modules/plugin_guard.h"
 #include "platform/file_io.h"
 #include "platform/log.h"
 #include "values/deep_copy.h"
@@ -51,8 +49,8 @@ UUID* PMModule::interfaceID() const { return QuarrinModuleFactory::pmIntfID(); }
 
 Ref<Array> PMModule::askPluginOnce(const String& connectionType) {
   Ref<Array> answer;
-  auto raised = guardPluginCall(
-      [&] { answer = plugin_calls::createBrowserInfo(pluginInterface(), connectionType); });
+  auto raised =
+      callPlugin([&] { answer = runner().createBrowserInfo(interfaceHandle(), connectionType); });
   if (raised) {
     log("[%@] on call to 'CreateBrowserInfo' for '%@'", *raised, pluginURL());
     return nullptr;
@@ -62,6 +60,7 @@ Ref<Array> PMModule::askPluginOnce(const String& connectionType) {
 
 Ref<Array> PMModule::askPlugin(const String& connectionType) {
   Ref<Array> answer = askPluginOnce(connectionType);
+  if (lost()) return nullptr;
   // Either network discovery type stands for the other, so the answer
   // recorded under "DNSSD" does not depend on which type is asked first.
   if (isEmpty(answer.get()) && connectionType.equals(kDNSSD))
@@ -76,6 +75,7 @@ Ref<MutableArray> PMModule::createBrowserInfoForConnectionType(const String& con
   const URL* url = pluginURL().get();
   Ref<MutableArray> result;
   bool answered = false;
+  if (lost()) return nullptr;
   if (!interfaceLoaded()) {
     result = cache.getInfoForPrinterModule(url, &connectionType);
     if (isEmpty(result.get()) && connectionType.equals(kQuellnet))
@@ -85,6 +85,7 @@ Ref<MutableArray> PMModule::createBrowserInfoForConnectionType(const String& con
   }
   if (!answered && loadPluginInterface()) {
     Ref<Array> answer = askPlugin(connectionType);
+    if (lost()) return nullptr;
     if (answer)
       result = cast<MutableArray>(deepCopy(*answer, Mutability::MutableContainersAndLeaves));
     Ref<String> key(const_cast<String*>(&connectionType));

@@ -4,12 +4,17 @@
 
 #include <cstdio>
 #include <cstdlib>
+#include <memory>
+#include <set>
+#include <string>
 
+#include "cache/failure_memory.h"
 #include "cache/module_cache.h"
 #include "modules/module_factory.h"
 #include "platform/file_io.h"
 #include "platform/log.h"
 #include "plist/property_list.h"
+#include "scanner/scanner_client.h"
 #include "tool/discovery.h"
 #include "values/dictionary.h"
 #include "values/string.h"
@@ -27,9 +32,15 @@ constexpr int kMaxDiscoveryDepth = 200;
 // Path mode: exactly one word after the program name, and it begins with "/".
 bool isPathMode(int argc, char** argv) { return argc == 2 && argv[1][0] == '/'; }
 
+void addURLs(const QuarrinHost& host, std::set<std::string>& urls) {
+  for (const auto& key : host.loadedPlugins()->keys())
+    if (auto* url = cast<URL>(key.get())) urls.insert(url->absoluteString());
+}
+
 // Finds the installed modules and asks each what it offers; the answers land
 // in the cache. The hosts, and with them every module, go when this returns.
-void askModules() {
+// Gives the URLs of the modules found.
+std::set<std::string> askModules() {
   auto pmHost = make<PMHost>();
   auto iomHost = make<IOMHost>();
   auto pbmHost = make<PBMHost>();
@@ -39,6 +50,12 @@ void askModules() {
     auto* record = cast<ConnectionInfo>(item.get());
     if (record && record->connectionType()) pmHost->GetLookupInfoList(*record->connectionType());
   }
+  std::set<std::string> installed;
+  for (const QuarrinHost* host :
+       {static_cast<QuarrinHost*>(pmHost.get()), static_cast<QuarrinHost*>(iomHost.get()),
+        static_cast<QuarrinHost*>(pbmHost.get())})
+    addURLs(*host, installed);
+  return installed;
 }
 
 // Serialises before opening the file, so a value that cannot be written
@@ -50,7 +67,7 @@ bool writeCacheFile(const char* path) {
 
 }  // namespace
 
-int runCachewright(int argc, char** argv) {
+int runCachewright(int argc, char** argv, bool isolatePlugins) {
   bool streamMode = false;
   for (int opt; (opt = getopt(argc, argv, "s?")) != -1;) {
     if (opt != 's') {
@@ -65,7 +82,14 @@ int runCachewright(int argc, char** argv) {
   else if (isPathMode(argc, argv))
     QuarrinModuleCache::defaultCache().setCacheDict(make<MutableDictionary>());
 
-  askModules();
+  // Plug-in code runs in the helper: a plug-in that crashes or hangs loses
+  // only its own answers. Path mode asks again the modules that failed before.
+  if (isolatePlugins) PluginRunner::install(std::make_unique<ScannerClient>(scannerProgramPath()));
+  if (isPathMode(argc, argv)) FailureMemory::shared().setConsulted(false);
+  std::set<std::string> installed = askModules();
+  PluginRunner::install(nullptr);
+  FailureMemory::shared().keepOnly(installed);
+  FailureMemory::shared().save();
 
   int status;
   if (streamMode) {

@@ -7,6 +7,8 @@ namespace qr {
 
 extern const char kCachewrightUsage[];
 
-int runCachewright(int argc, char** argv);
+// Plug-in code runs in the helper process unless isolatePlugins is false,
+// which only a benchmark comparing the two should ask for.
+int runCachewright(int argc, char** argv, bool isolatePlugins = true);
 
 }  // namespace qr

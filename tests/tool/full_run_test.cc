@@ -2,14 +2,9 @@
 // which plug-ins ran and by the cache the runs leave in the store.
 #include <gtest/gtest.h>
 
-#include <filesystem>
-#include <regex>
 #include <set>
 
-#include "fixtures/fixture_support.h"
-#include "plist/property_list.h"
-#include "support/run_program.h"
-#include "values/dictionary.h"
+#include "support/installation.h"
 
 using namespace qr;
 
@@ -18,34 +13,19 @@ namespace {
 const std::set<std::string> kInstalled = {"c_iom", "io_dnssd", "c_pm", "pm_dnssd", "pm_usb_only"};
 
 TEST(FullRun, WarmRunsLoadNothingABumpReloadsOneModuleAndPathModeAsksAll) {
-  qrtest::TempDir dir;
-  const std::string printers = dir / "Printers", store = dir / "prefs.plist";
-  std::filesystem::create_directories(printers);
-  for (const auto& name : kInstalled)
-    std::filesystem::copy(qr::test::fixtureBundle(name), printers + "/" + name + ".plugin",
-                          std::filesystem::copy_options::recursive);
-  dir.write("Z.framework/Resources/com.varnex.pm.xml",
-            "<plist version=\"1.0\"><dict><key>PM Search Directories</key><array><string>" +
-                printers + "</string></array></dict></plist>");
-  dir.write("prefs.plist",
-            "<plist version=\"1.0\"><dict><key>support_quarrin</key><string>YES</string>"
-            "</dict></plist>");
+  qrtest::Installation install({kInstalled.begin(), kInstalled.end()});
+  const std::string store = install.store();
   // The fixtures that ran, and the cache in the store afterwards.
   auto run = [&](std::vector<std::string> args, int status) {
     qr::test::FixtureCalls calls;
-    qrtest::ProgramOptions o;
-    o.args = std::move(args);
-    o.env = {{"CACHEWRIGHT_FRAMEWORK", dir / "Z.framework"}, {"CACHEWRIGHT_PREFS", store}};
-    auto r = qrtest::runProgram(QUARRIN_BINARY_DIR "/src/cachewright", o);
+    auto r = install.run(std::move(args));
     EXPECT_EQ(r.status, status) << r.err;
     std::set<std::string> ran;
     for (const auto& line : calls.lines()) ran.insert(line.substr(0, line.find(' ')));
-    auto prefs = cast<Dictionary>(readPropertyListFile(store));
-    return std::pair{ran, Ref<Dictionary>(prefs->getAs<Dictionary>("pmcache 5"))};
+    return std::pair{ran, install.stored("pmcache 5")};
   };
-  auto key = [&](const std::string& name) {
-    return "file://" + printers + "/" + name + ".plugin/";
-  };
+  auto key = [&](const std::string& name) { return install.key(name); };
+  const qrtest::TempDir& dir = install.dir();
 
   auto [cold, first] = run({}, 1);
   EXPECT_EQ(cold, kInstalled);
@@ -56,12 +36,10 @@ TEST(FullRun, WarmRunsLoadNothingABumpReloadsOneModuleAndPathModeAsksAll) {
   EXPECT_TRUE(second->isEqual(*first));
 
   // c_pm's new version drops its whole entry, a planted connection type too.
-  std::string prefs = qrtest::readText(store), info = printers + "/c_pm.plugin/Contents/Info.plist";
+  std::string prefs = qrtest::readText(store);
   prefs.insert(prefs.find("<dict>", prefs.find(key("c_pm"))) + 6, "<key>Stale</key><array/>");
   qrtest::writeText(store, prefs);
-  qrtest::writeText(info, std::regex_replace(
-                              qrtest::readText(info),
-                              std::regex("(ShortVersionString</key>\\s*<string>)[^<]*"), "$012.0"));
+  install.setVersion("c_pm", "2.0");
   auto [bumped, third] = run({}, 1);
   EXPECT_EQ(bumped, std::set<std::string>{"c_pm"});
   auto* entry = third->getAs<Dictionary>(key("c_pm"));

@@ -1,0 +1,241 @@
+#include "scanner/scanner_client.h"
+
+#include <time.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <climits>
+#include <cstdlib>
+
+#include "platform/frame_channel.h"
+#include "platform/log.h"
+#include "plist/property_list.h"
+#include "scanner/scanner_protocol.h"
+#include "values/exception.h"
+#include "values/number.h"
+
+namespace qr {
+namespace {
+
+using namespace scanner;
+
+constexpr int kDefaultTimeoutSeconds = 10;
+// A helper whose pipe closed gets this long to finish dying, so that its
+// exit status or signal can be told.
+constexpr int kExitGraceMs = 2000;
+
+int64_t nowMs() {
+  timespec t;
+  ::clock_gettime(CLOCK_MONOTONIC, &t);
+  return int64_t(t.tv_sec) * 1000 + t.tv_nsec / 1000000;
+}
+
+int64_t integerValue(const Dictionary& d, std::string_view key) {
+  auto* number = d.getAs<Number>(key);
+  return number ? number->int64Value() : 0;
+}
+
+Ref<String> stringValue(const Dictionary& d, std::string_view key) {
+  return Ref<String>(d.getAs<String>(key));
+}
+
+// The plug-in's raise, passed on to the module as if it had happened here.
+Ref<Dictionary> passRaise(Ref<Dictionary> reply) {
+  if (auto* raised = reply->getAs<String>(kRaised)) {
+    auto* reason = reply->getAs<String>(kReason);
+    throw Exception(raised->utf8(), reason ? reason->utf8() : "");
+  }
+  return reply;
+}
+
+Ref<MutableDictionary> request(std::string_view call) {
+  auto r = make<MutableDictionary>();
+  r->set(kCall, String::make(call));
+  return r;
+}
+
+bool isExecutable(const std::string& path) { return ::access(path.c_str(), X_OK) == 0; }
+
+}  // namespace
+
+std::string scannerProgramPath() {
+  if (const char* path = secure_getenv("CACHEWRIGHT_SCANNER"); path && *path) return path;
+  if (isExecutable(QUARRIN_SCANNER_PATH)) return QUARRIN_SCANNER_PATH;
+  char self[PATH_MAX];
+  ssize_t n = ::readlink("/proc/self/exe", self, sizeof self - 1);
+  if (n > 0) {
+    std::string beside(self, size_t(n));
+    beside = beside.substr(0, beside.rfind('/') + 1) + "cachewright-scanner";
+    if (isExecutable(beside)) return beside;
+  }
+  return QUARRIN_SCANNER_PATH;
+}
+
+int pluginCallTimeoutSeconds() {
+  const char* text = secure_getenv("CACHEWRIGHT_PLUGIN_TIMEOUT");
+  if (!text) return kDefaultTimeoutSeconds;
+  char* end = nullptr;
+  errno = 0;
+  long seconds = std::strtol(text, &end, 10);
+  if (errno == 0 && end != text && *end == '\0' && seconds >= 1 && seconds <= 3600)
+    return static_cast<int>(seconds);
+  log("CACHEWRIGHT_PLUGIN_TIMEOUT=\"%s\" is not a whole number of seconds from 1 to 3600; "
+      "using %d",
+      text, kDefaultTimeoutSeconds);
+  return kDefaultTimeoutSeconds;
+}
+
+ScannerClient::ScannerClient(std::string program, int timeoutSeconds)
+    : program_(std::move(program)), timeoutSeconds_(timeoutSeconds) {}
+
+ScannerClient::~ScannerClient() {
+  // Closing the socket ends the helper; one stuck in a plug-in's exit code is killed.
+  if (helper_) helper_->finish(kExitGraceMs);
+}
+
+void ScannerClient::start() {
+  if (timeoutSeconds_ == 0) timeoutSeconds_ = pluginCallTimeoutSeconds();
+  // No module can be asked without it; each says so, and none is remembered as failed.
+  if (unavailable_) throw Exception("QrScannerUnavailable", program_);
+  std::string error;
+  helper_ = ChildProcess::start(program_, &error);
+  if (!helper_) {
+    unavailable_ = true;
+    log("Cannot start the plug-in helper %s: %s", program_, error);
+    throw Exception("QrScannerUnavailable", program_);
+  }
+  ++generation_;
+}
+
+void ScannerClient::lose(const std::string& entry, const std::string& what) {
+  helper_.reset();
+  throw PluginCallLost{what, entry};
+}
+
+Ref<Dictionary> ScannerClient::call(std::string_view firstEntry,
+                                    const Ref<MutableDictionary>& message) {
+  if (!helper_) start();
+  std::string entry(firstEntry);
+  auto bytes = writeBinaryPropertyList(*message);
+  if (!bytes) throw Exception("QrScannerRequest", "a question that cannot be sent");
+  if (!sendFrame(helper_->socket(), *bytes)) lose(entry, helper_->finish(kExitGraceMs));
+  int64_t deadline = nowMs() + int64_t(timeoutSeconds_) * 1000;
+  std::string payload;
+  for (;;) {
+    int left = static_cast<int>(std::max<int64_t>(deadline - nowMs(), 0));
+    switch (receiveFrame(helper_->socket(), payload, kMaxFrameSize, left)) {
+      case FrameResult::Received:
+        break;
+      case FrameResult::Closed:
+        lose(entry, helper_->finish(kExitGraceMs));
+      case FrameResult::TimedOut:
+        helper_->finish(0);
+        lose(entry, "timed out after " + std::to_string(timeoutSeconds_) + " s");
+      case FrameResult::TooLarge:
+        helper_->finish(0);
+        lose(entry, "unreadable answer");
+    }
+    auto frame = cast<Dictionary>(readBinaryPropertyList(payload, Mutability::Immutable));
+    if (!frame) {
+      helper_->finish(0);
+      lose(entry, "unreadable answer");
+    }
+    if (auto* line = frame->getAs<String>(kLog)) {
+      logMessage(line->utf8());
+    } else if (auto* next = frame->getAs<String>(kEntry)) {
+      // Each entry into the plug-in has a time limit of its own.
+      entry = next->utf8();
+      deadline = nowMs() + int64_t(timeoutSeconds_) * 1000;
+    } else if (frame->get(kDone)) {
+      return frame;
+    }
+  }
+}
+
+PluginHandle ScannerClient::keep(Remote remote) {
+  handles_.push_back(std::move(remote));
+  return handles_.size();
+}
+
+int64_t ScannerClient::remoteInstance(const std::string& bundle, const std::string& factory,
+                                      const std::string& type) {
+  auto message = request(kCreateInstance);
+  message->set(kBundle, String::make(bundle));
+  message->set(kFactory, String::make(factory));
+  message->set(kType, String::make(type));
+  return integerValue(*passRaise(call(kCreateInstance, message)), kHandle);
+}
+
+PluginHandle ScannerClient::createInstance(PlugIn& plugin, const UUID& factoryID,
+                                           const UUID& typeID) {
+  Remote remote{0, 0, plugin.url()->absoluteString(), factoryID.string(), typeID.string(), ""};
+  remote.address = remoteInstance(remote.bundle, remote.factory, remote.type);
+  remote.generation = generation_;
+  return remote.address ? keep(std::move(remote)) : 0;
+}
+
+int32_t ScannerClient::queryInterface(PluginHandle instance, const UUID& interfaceID,
+                                      PluginHandle* out) {
+  *out = 0;
+  if (instance == 0 || instance > handles_.size()) return -1;
+  Remote remote = handles_[instance - 1];
+  if (remote.generation != generation_) return -1;  // it died with its helper
+  auto message = request(kQueryInterface);
+  message->set(kHandle, Number::integer(remote.address));
+  message->set(kInterface, String::make(interfaceID.string()));
+  Ref<Dictionary> reply = passRaise(call(kQueryInterface, message));
+  remote.interface = interfaceID.string();
+  remote.address = integerValue(*reply, kHandle);
+  if (remote.address) *out = keep(std::move(remote));
+  return static_cast<int32_t>(integerValue(*reply, kStatus));
+}
+
+void ScannerClient::releaseInstance(PluginHandle instance) {
+  if (instance == 0 || instance > handles_.size()) return;
+  const Remote& remote = handles_[instance - 1];
+  if (remote.generation != generation_) return;
+  auto message = request(kRelease);
+  message->set(kHandle, Number::integer(remote.address));
+  passRaise(call(kRelease, message));
+}
+
+int64_t ScannerClient::liveAddress(PluginHandle handle) {
+  if (handle == 0 || handle > handles_.size()) return 0;
+  if (!helper_) start();
+  Remote& remote = handles_[handle - 1];
+  if (remote.generation == generation_) return remote.address;
+  // Another module took the helper down: make this one's interface again in
+  // the fresh helper, the way it was made the first time.
+  int64_t instance = remoteInstance(remote.bundle, remote.factory, remote.type);
+  if (!instance) return 0;
+  auto query = request(kQueryInterface);
+  query->set(kHandle, Number::integer(instance));
+  query->set(kInterface, String::make(remote.interface));
+  int64_t address = integerValue(*passRaise(call(kQueryInterface, query)), kHandle);
+  auto release = request(kRelease);
+  release->set(kHandle, Number::integer(instance));
+  passRaise(call(kRelease, release));
+  handles_[handle - 1].address = address;
+  handles_[handle - 1].generation = generation_;
+  return address;
+}
+
+int32_t ScannerClient::getConnectionInfo(PluginHandle interface, Ref<String>* connectionType,
+                                         Ref<String>* pbmPath) {
+  auto message = request(kGetConnectionInfo);
+  message->set(kHandle, Number::integer(liveAddress(interface)));
+  Ref<Dictionary> reply = call(kGetConnectionInfo, message);
+  // What the plug-in stored before raising still counts; the helper sent it along.
+  *connectionType = stringValue(*reply, kConnectionType);
+  *pbmPath = stringValue(*reply, kPBMPath);
+  return static_cast<int32_t>(integerValue(*passRaise(reply), kStatus));
+}
+
+Ref<Array> ScannerClient::createBrowserInfo(PluginHandle interface, const String& connectionType) {
+  auto message = request(kCreateBrowserInfo);
+  message->set(kHandle, Number::integer(liveAddress(interface)));
+  message->set(kConnectionType, connectionType.copy());
+  return Ref<Array>(passRaise(call(kCreateBrowserInfo, message))->getAs<Array>(kAnswer));
+}
+
+}  // namespace qr

@@ -1,0 +1,60 @@
+// A helper that answers garbage, a cut frame, an outsized frame, a value that
+// is no message, or nothing: each is one failed call, never a crash or a hang.
+#include <gtest/gtest.h>
+
+#include "fixtures/fixture_support.h"
+#include "plist/property_list.h"
+#include "scanner/scanner_client.h"
+#include "support/temp_dir.h"
+#include "values/exception.h"
+#include "values/string.h"
+
+using namespace qr;
+
+namespace {
+
+TEST(ScannerClient, ABrokenHelperIsALostCall) {
+  qrtest::TempDir dir;
+  const std::string notAMessage = *writeBinaryPropertyList(*String::make("done"));
+  dir.write("not-a-message", std::string("\0\0\0", 3) + char(notAMessage.size()) + notAMessage);
+  const struct {
+    const char* script;  // what the helper does on fd 3
+    const char* lost;    // how the call is reported
+  } kHelpers[] = {
+      {"printf '\\000\\000\\000\\005hello' >&3; sleep 5", "unreadable answer"},
+      {"printf '\\000\\000\\000\\020abc' >&3; exit 4", "exit status 4"},
+      {"printf '\\177\\377\\377\\377' >&3; sleep 5", "unreadable answer"},
+      {"cat not-a-message >&3; sleep 5", "unreadable answer"},
+      {"sleep 5", "timed out after 1 s"},
+      {"kill -KILL $$", "SIGKILL"},
+  };
+  auto plugin = PlugIn::create(*qr::test::fixtureURL("c_iom"));
+  for (const auto& helper : kHelpers) {
+    std::string program = dir.write(
+        "helper", std::string("#!/bin/sh\ncd ") + dir.path() + "\n" + helper.script + "\n");
+    chmod(program.c_str(), 0755);
+    ScannerClient client(program, 1);
+    try {
+      client.createInstance(*plugin, *QuarrinModuleFactory::iomTypeID(),
+                            *QuarrinModuleFactory::iomTypeID());
+      ADD_FAILURE() << helper.script << " answered";
+    } catch (const PluginCallLost& lost) {
+      EXPECT_EQ(lost.what, helper.lost) << helper.script;
+      EXPECT_EQ(lost.entry, "load");
+      EXPECT_EQ(client.helperPid(), 0);
+    }
+  }
+}
+
+TEST(ScannerClient, AMissingHelperIsSaidOnceAndNoModuleIsBlamed) {
+  qr::test::CapturedLog log;
+  ScannerClient client("/nonexistent/cachewright-scanner", 1);
+  auto plugin = PlugIn::create(*qr::test::fixtureURL("c_iom"));
+  for (int i = 0; i < 2; ++i)
+    EXPECT_THROW(client.createInstance(*plugin, *QuarrinModuleFactory::iomTypeID(),
+                                       *QuarrinModuleFactory::iomTypeID()),
+                 Exception);
+  EXPECT_EQ(log.count("Cannot start the plug-in helper /nonexistent/cachewright-scanner"), 1u);
+}
+
+}  // namespace
