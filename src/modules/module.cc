@@ -42,26 +42,22 @@ bool QuarrinModule::loadPluginInterface() {
     QuarrinModuleFactory::countLoadFailure();
     return false;
   }
-  PluginRunner& calls = runner();
-  PluginHandle instance = 0;
-  auto raised = callPlugin([&] {
-    instance = calls.createInstance(*_pluginRef, *_factoryID, *type);
-    if (!instance) return;
-    int32_t result = calls.queryInterface(instance, *interface, &_interface);
-    if (result < 0) {
-      auto bits = static_cast<uint32_t>(result);
+  InterfaceLoad load;
+  // The runner reports the plug-in's raises; one that comes back here is the runner's own.
+  if (auto raised = callPlugin(
+          [&] { load = runner().loadInterface(*_pluginRef, *_factoryID, *type, *interface); }))
+    load.raised = raised;
+  if (!_lost) {
+    _interface = load.interface;
+    if (load.instanceMade && !load.raised && load.queryResult < 0) {
+      auto bits = static_cast<uint32_t>(load.queryResult);
       log("Unble to obtain interface[%@:(%@,%@)]: code:%d facility:%d severity:%d", _pluginURL,
           type->string(), interface->string(), static_cast<int>(bits & 0xFFFF),
           static_cast<int>((bits >> 16) & 0x1FFF), static_cast<int>(bits >> 31));
     }
-  });
-  if (raised) {
-    _interface = 0;
-    log("[%@] creating an interface for '%@'", *raised, _pluginURL);
-  }
-  if (instance && !_lost) {
-    if (auto releaseRaised = callPlugin([&] { calls.releaseInstance(instance); }))
-      log("[%@] creating an interface for '%@'", *releaseRaised, _pluginURL);
+    if (load.raised) log("[%@] creating an interface for '%@'", *load.raised, _pluginURL);
+    if (load.releaseRaised)
+      log("[%@] creating an interface for '%@'", *load.releaseRaised, _pluginURL);
   }
   if (!_interface) QuarrinModuleFactory::countLoadFailure();
   return _interface != 0;

@@ -1,36 +1,13 @@
 #include "modules/plugin_runner.h"
 
 #include "modules/plugin_calls.h"
+#include "modules/plugin_guard.h"
 
 namespace qr {
 namespace {
 
 void* pointer(PluginHandle handle) { return reinterpret_cast<void*>(handle); }
 PluginHandle handle(void* pointer) { return reinterpret_cast<PluginHandle>(pointer); }
-
-class InProcessRunner final : public PluginRunner {
- public:
-  PluginHandle createInstance(PlugIn& plugin, const UUID& factoryID, const UUID& typeID) override {
-    return handle(plugin.createInstance(factoryID, typeID));
-  }
-  int32_t queryInterface(PluginHandle instance, const UUID& interfaceID,
-                         PluginHandle* out) override {
-    void* interface = nullptr;
-    int32_t result = plugin_calls::queryInterface(pointer(instance), interfaceID, &interface);
-    *out = handle(interface);
-    return result;
-  }
-  void releaseInstance(PluginHandle instance) override {
-    plugin_calls::releaseInstance(pointer(instance));
-  }
-  int32_t getConnectionInfo(PluginHandle interface, Ref<String>* connectionType,
-                            Ref<String>* pbmPath) override {
-    return plugin_calls::getConnectionInfo(pointer(interface), connectionType, pbmPath);
-  }
-  Ref<Array> createBrowserInfo(PluginHandle interface, const String& connectionType) override {
-    return plugin_calls::createBrowserInfo(pointer(interface), connectionType);
-  }
-};
 
 std::unique_ptr<PluginRunner>& installed() {
   static std::unique_ptr<PluginRunner> runner;
@@ -39,7 +16,40 @@ std::unique_ptr<PluginRunner>& installed() {
 
 }  // namespace
 
-PluginRunner& PluginRunner::inProcess() {
+InterfaceLoad InProcessRunner::loadInterface(PlugIn& plugin, const UUID& factoryID,
+                                             const UUID& typeID, const UUID& interfaceID) {
+  InterfaceLoad load;
+  void* instance = nullptr;
+  load.raised = guardPluginCall([&] {
+    instance = plugin.createInstance(factoryID, typeID, [this] { entering("factory"); });
+    if (!instance) return;
+    load.instanceMade = true;
+    void* interface = nullptr;
+    entering("QueryInterface");
+    load.queryResult = plugin_calls::queryInterface(instance, interfaceID, &interface);
+    load.interface = handle(interface);
+  });
+  if (load.raised) load.interface = 0;
+  if (instance) {
+    entering("Release");
+    load.releaseRaised = guardPluginCall([&] { plugin_calls::releaseInstance(instance); });
+  }
+  return load;
+}
+
+int32_t InProcessRunner::getConnectionInfo(PluginHandle interface, Ref<String>* connectionType,
+                                           Ref<String>* pbmPath) {
+  entering("GetConnectionInfo");
+  return plugin_calls::getConnectionInfo(pointer(interface), connectionType, pbmPath);
+}
+
+Ref<Array> InProcessRunner::createBrowserInfo(PluginHandle interface,
+                                              const String& connectionType) {
+  entering("CreateBrowserInfo");
+  return plugin_calls::createBrowserInfo(pointer(interface), connectionType);
+}
+
+InProcessRunner& PluginRunner::inProcess() {
   static InProcessRunner* const runner = new InProcessRunner;
   return *runner;
 }

@@ -6,7 +6,9 @@
 #pragma once
 
 #include <cstdint>
+#include <functional>
 #include <memory>
+#include <optional>
 #include <string>
 
 #include "bundles/plugin_model.h"
@@ -20,22 +22,33 @@ using PluginHandle = uint64_t;
 
 // Thrown by a runner when a call never came back: the process running the
 // plug-in died or fell silent.
+class InProcessRunner;
+
 struct PluginCallLost {
   std::string what;   // "SIGSEGV", "exit status 3", "timed out after 2 s"
   std::string entry;  // the call it happened in: "load", "factory", "QueryInterface", ...
+};
+
+// What making a module's interface gave, step by step, for the module to
+// report in order.
+struct InterfaceLoad {
+  bool instanceMade = false;
+  int32_t queryResult = 0;  // what QueryInterface returned, when it was called and returned
+  PluginHandle interface = 0;
+  std::optional<std::string> raised;  // the platform exception of the factory or QueryInterface
+  std::optional<std::string> releaseRaised;
 };
 
 class PluginRunner {
  public:
   virtual ~PluginRunner() = default;
 
-  // The platform exception a plug-in raises passes through every call below.
-  // An instance of the type from the factory, or 0 (logged).
-  virtual PluginHandle createInstance(PlugIn& plugin, const UUID& factoryID,
-                                      const UUID& typeID) = 0;
-  virtual int32_t queryInterface(PluginHandle instance, const UUID& interfaceID,
-                                 PluginHandle* out) = 0;
-  virtual void releaseInstance(PluginHandle instance) = 0;
+  // Creates an instance of the type from the factory, asks it for the
+  // interface and releases it: each module does this at most once. Raised
+  // platform exceptions are reported in the result.
+  virtual InterfaceLoad loadInterface(PlugIn& plugin, const UUID& factoryID, const UUID& typeID,
+                                      const UUID& interfaceID) = 0;
+  // The platform exception a plug-in raises in these passes through to the caller.
   // What the plug-in stored reaches the outputs even when it raises.
   virtual int32_t getConnectionInfo(PluginHandle interface, Ref<String>* connectionType,
                                     Ref<String>* pbmPath) = 0;
@@ -44,9 +57,28 @@ class PluginRunner {
 
   // The runner modules use unless they must stay in this process.
   static PluginRunner& current();
-  static PluginRunner& inProcess();
+  static InProcessRunner& inProcess();
   // Replaces the current runner; null goes back to running in this process.
   static void install(std::unique_ptr<PluginRunner> runner);
+};
+
+// Calls plug-in code in this process; a handle is the plug-in's own pointer.
+class InProcessRunner final : public PluginRunner {
+ public:
+  InterfaceLoad loadInterface(PlugIn& plugin, const UUID& factoryID, const UUID& typeID,
+                              const UUID& interfaceID) override;
+  int32_t getConnectionInfo(PluginHandle interface, Ref<String>* connectionType,
+                            Ref<String>* pbmPath) override;
+  Ref<Array> createBrowserInfo(PluginHandle interface, const String& connectionType) override;
+
+  // Told the name of each entry into plug-in code just before it is made.
+  void setEntryHook(std::function<void(const char* entry)> hook) { entering_ = std::move(hook); }
+
+ private:
+  void entering(const char* entry) const {
+    if (entering_) entering_(entry);
+  }
+  std::function<void(const char*)> entering_;
 };
 
 }  // namespace qr

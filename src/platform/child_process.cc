@@ -29,6 +29,15 @@ bool waitExited(pid_t pid, int* status, int graceMs) {
   }
 }
 
+// Above the descriptors the helper's are moved to, so that no move overwrites
+// one still to be moved.
+int aboveHelperFds(int fd) {
+  if (fd < 0 || fd > 9) return fd;
+  int moved = ::fcntl(fd, F_DUPFD_CLOEXEC, 10);
+  ::close(fd);
+  return moved;
+}
+
 }  // namespace
 
 std::string signalName(int signal) {
@@ -37,12 +46,14 @@ std::string signalName(int signal) {
   return std::string("SIG") + abbreviation;
 }
 
-std::unique_ptr<ChildProcess> ChildProcess::start(const std::string& program, std::string* error) {
+std::unique_ptr<ChildProcess> ChildProcess::start(const std::string& program, std::string* error,
+                                                  int passFd, int passAs) {
   int pair[2];
   if (::socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, pair) != 0) {
     *error = std::strerror(errno);
     return nullptr;
   }
+  pair[1] = aboveHelperFds(pair[1]);
   // posix_spawn, not fork: the parent may hold a large heap, and the helper
   // arms its own death signal.
   posix_spawn_file_actions_t actions;
@@ -50,6 +61,8 @@ std::unique_ptr<ChildProcess> ChildProcess::start(const std::string& program, st
   posix_spawn_file_actions_addopen(&actions, STDIN_FILENO, "/dev/null", O_RDONLY, 0);
   posix_spawn_file_actions_adddup2(&actions, STDERR_FILENO, STDOUT_FILENO);
   posix_spawn_file_actions_adddup2(&actions, pair[1], kSocketFd);
+  int passing = passFd >= 0 ? ::fcntl(passFd, F_DUPFD_CLOEXEC, 10) : -1;
+  if (passing >= 0) posix_spawn_file_actions_adddup2(&actions, passing, passAs);
   std::string parent = std::to_string(::getpid());
   std::vector<char*> argv{const_cast<char*>(program.c_str()), const_cast<char*>("--parent"),
                           parent.data(), nullptr};
@@ -57,6 +70,7 @@ std::unique_ptr<ChildProcess> ChildProcess::start(const std::string& program, st
   int result = ::posix_spawn(&pid, program.c_str(), &actions, nullptr, argv.data(), environ);
   posix_spawn_file_actions_destroy(&actions);
   ::close(pair[1]);
+  if (passing >= 0) ::close(passing);
   if (result != 0) {
     ::close(pair[0]);
     *error = std::strerror(result);

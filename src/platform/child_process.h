@@ -17,8 +17,10 @@ class ChildProcess {
 
   // Starts program with the socket's other end as descriptor kSocketFd,
   // standard input from /dev/null and standard output onto our standard
-  // error, plus "--parent <our pid>". Null with *error set when it cannot start.
-  static std::unique_ptr<ChildProcess> start(const std::string& program, std::string* error);
+  // error, plus "--parent <our pid>"; passFd, when not negative, becomes the
+  // helper's descriptor passAs. Null with *error set when it cannot start.
+  static std::unique_ptr<ChildProcess> start(const std::string& program, std::string* error,
+                                             int passFd = -1, int passAs = -1);
   ~ChildProcess();  // kills and reaps it if still running
 
   ChildProcess(const ChildProcess&) = delete;

@@ -97,134 +97,97 @@ void ScannerClient::start() {
   if (timeoutSeconds_ == 0) timeoutSeconds_ = pluginCallTimeoutSeconds();
   // No module can be asked without it; each says so, and none is remembered as failed.
   if (unavailable_) throw Exception("QrScannerUnavailable", program_);
-  std::string error;
-  helper_ = ChildProcess::start(program_, &error);
+  std::string error = "no shared memory";
+  entryPage_ = SharedPage::create();
+  if (entryPage_) helper_ = ChildProcess::start(program_, &error, entryPage_->fd(), kEntryPageFd);
   if (!helper_) {
     unavailable_ = true;
     log("Cannot start the plug-in helper %s: %s", program_, error);
     throw Exception("QrScannerUnavailable", program_);
   }
+  reader_ = std::make_unique<FrameReader>(helper_->socket(), kMaxFrameSize);
   ++generation_;
 }
 
-void ScannerClient::lose(const std::string& entry, const std::string& what) {
+void ScannerClient::lose(const std::string& what) {
+  size_t entry = entryPage_->bytes()[0];
   helper_.reset();
-  throw PluginCallLost{what, entry};
+  reader_.reset();
+  throw PluginCallLost{what, std::string(kEntries[entry < kEntries.size() ? entry : 0])};
 }
 
-Ref<Dictionary> ScannerClient::call(std::string_view firstEntry,
-                                    const Ref<MutableDictionary>& message) {
+Ref<Dictionary> ScannerClient::call(std::string_view entry, const Dictionary& request) {
   if (!helper_) start();
-  std::string entry(firstEntry);
-  auto bytes = writeBinaryPropertyList(*message);
+  auto bytes = writeBinaryPropertyList(request);
   if (!bytes) throw Exception("QrScannerRequest", "a question that cannot be sent");
-  if (!sendFrame(helper_->socket(), *bytes)) lose(entry, helper_->finish(kExitGraceMs));
+  entryPage_->bytes()[0] = static_cast<uint8_t>(entryNumber(entry));
+  if (!sendFrame(helper_->socket(), *bytes)) lose(helper_->finish(kExitGraceMs));
   int64_t deadline = nowMs() + int64_t(timeoutSeconds_) * 1000;
   std::string payload;
   for (;;) {
     int left = static_cast<int>(std::max<int64_t>(deadline - nowMs(), 0));
-    switch (receiveFrame(helper_->socket(), payload, kMaxFrameSize, left)) {
+    switch (reader_->receive(payload, left)) {
       case FrameResult::Received:
         break;
       case FrameResult::Closed:
-        lose(entry, helper_->finish(kExitGraceMs));
+        lose(helper_->finish(kExitGraceMs));
       case FrameResult::TimedOut:
         helper_->finish(0);
-        lose(entry, "timed out after " + std::to_string(timeoutSeconds_) + " s");
+        lose("timed out after " + std::to_string(timeoutSeconds_) + " s");
       case FrameResult::TooLarge:
         helper_->finish(0);
-        lose(entry, "unreadable answer");
+        lose("unreadable answer");
     }
     auto frame = cast<Dictionary>(readBinaryPropertyList(payload, Mutability::Immutable));
     if (!frame) {
       helper_->finish(0);
-      lose(entry, "unreadable answer");
+      lose("unreadable answer");
     }
-    if (auto* line = frame->getAs<String>(kLog)) {
+    if (auto* line = frame->getAs<String>(kLog))
       logMessage(line->utf8());
-    } else if (auto* next = frame->getAs<String>(kEntry)) {
-      // Each entry into the plug-in has a time limit of its own.
-      entry = next->utf8();
-      deadline = nowMs() + int64_t(timeoutSeconds_) * 1000;
-    } else if (frame->get(kDone)) {
+    else if (frame->get(kDone))
       return frame;
-    }
   }
 }
 
-PluginHandle ScannerClient::keep(Remote remote) {
-  handles_.push_back(std::move(remote));
-  return handles_.size();
-}
-
-int64_t ScannerClient::remoteInstance(const std::string& bundle, const std::string& factory,
-                                      const std::string& type) {
-  auto message = request(kCreateInstance);
-  message->set(kBundle, String::make(bundle));
-  message->set(kFactory, String::make(factory));
-  message->set(kType, String::make(type));
-  return integerValue(*passRaise(call(kCreateInstance, message)), kHandle);
-}
-
-PluginHandle ScannerClient::createInstance(PlugIn& plugin, const UUID& factoryID,
-                                           const UUID& typeID) {
-  Remote remote{0, 0, plugin.url()->absoluteString(), factoryID.string(), typeID.string(), ""};
-  remote.address = remoteInstance(remote.bundle, remote.factory, remote.type);
-  remote.generation = generation_;
-  return remote.address ? keep(std::move(remote)) : 0;
-}
-
-int32_t ScannerClient::queryInterface(PluginHandle instance, const UUID& interfaceID,
-                                      PluginHandle* out) {
-  *out = 0;
-  if (instance == 0 || instance > handles_.size()) return -1;
-  Remote remote = handles_[instance - 1];
-  if (remote.generation != generation_) return -1;  // it died with its helper
-  auto message = request(kQueryInterface);
-  message->set(kHandle, Number::integer(remote.address));
+InterfaceLoad ScannerClient::loadInterface(PlugIn& plugin, const UUID& factoryID,
+                                           const UUID& typeID, const UUID& interfaceID) {
+  auto message = request(kLoad);
+  message->set(kBundle, String::make(plugin.url()->absoluteString()));
+  message->set(kFactory, String::make(factoryID.string()));
+  message->set(kType, String::make(typeID.string()));
   message->set(kInterface, String::make(interfaceID.string()));
-  Ref<Dictionary> reply = passRaise(call(kQueryInterface, message));
-  remote.interface = interfaceID.string();
-  remote.address = integerValue(*reply, kHandle);
-  if (remote.address) *out = keep(std::move(remote));
-  return static_cast<int32_t>(integerValue(*reply, kStatus));
-}
-
-void ScannerClient::releaseInstance(PluginHandle instance) {
-  if (instance == 0 || instance > handles_.size()) return;
-  const Remote& remote = handles_[instance - 1];
-  if (remote.generation != generation_) return;
-  auto message = request(kRelease);
-  message->set(kHandle, Number::integer(remote.address));
-  passRaise(call(kRelease, message));
+  Ref<Dictionary> reply = call(kLoad, *message);
+  InterfaceLoad load;
+  load.instanceMade = reply->get(kMade) != nullptr;
+  load.queryResult = static_cast<int32_t>(integerValue(*reply, kStatus));
+  if (auto* raised = reply->getAs<String>(kRaised)) load.raised = raised->utf8();
+  if (auto* raised = reply->getAs<String>(kReleaseRaised)) load.releaseRaised = raised->utf8();
+  if (int64_t address = integerValue(*reply, kHandle)) {
+    handles_.push_back({generation_, address, message});
+    load.interface = handles_.size();
+  }
+  return load;
 }
 
 int64_t ScannerClient::liveAddress(PluginHandle handle) {
   if (handle == 0 || handle > handles_.size()) return 0;
   if (!helper_) start();
   Remote& remote = handles_[handle - 1];
-  if (remote.generation == generation_) return remote.address;
-  // Another module took the helper down: make this one's interface again in
-  // the fresh helper, the way it was made the first time.
-  int64_t instance = remoteInstance(remote.bundle, remote.factory, remote.type);
-  if (!instance) return 0;
-  auto query = request(kQueryInterface);
-  query->set(kHandle, Number::integer(instance));
-  query->set(kInterface, String::make(remote.interface));
-  int64_t address = integerValue(*passRaise(call(kQueryInterface, query)), kHandle);
-  auto release = request(kRelease);
-  release->set(kHandle, Number::integer(instance));
-  passRaise(call(kRelease, release));
-  handles_[handle - 1].address = address;
-  handles_[handle - 1].generation = generation_;
-  return address;
+  if (remote.generation != generation_) {
+    // Another module took the helper down: make this one's interface again
+    // in the fresh helper, the way it was made the first time.
+    remote.address = integerValue(*call(kLoad, *remote.loadRequest), kHandle);
+    remote.generation = generation_;
+  }
+  return remote.address;
 }
 
 int32_t ScannerClient::getConnectionInfo(PluginHandle interface, Ref<String>* connectionType,
                                          Ref<String>* pbmPath) {
   auto message = request(kGetConnectionInfo);
   message->set(kHandle, Number::integer(liveAddress(interface)));
-  Ref<Dictionary> reply = call(kGetConnectionInfo, message);
+  Ref<Dictionary> reply = call(kGetConnectionInfo, *message);
   // What the plug-in stored before raising still counts; the helper sent it along.
   *connectionType = stringValue(*reply, kConnectionType);
   *pbmPath = stringValue(*reply, kPBMPath);
@@ -235,7 +198,7 @@ Ref<Array> ScannerClient::createBrowserInfo(PluginHandle interface, const String
   auto message = request(kCreateBrowserInfo);
   message->set(kHandle, Number::integer(liveAddress(interface)));
   message->set(kConnectionType, connectionType.copy());
-  return Ref<Array>(passRaise(call(kCreateBrowserInfo, message))->getAs<Array>(kAnswer));
+  return Ref<Array>(passRaise(call(kCreateBrowserInfo, *message))->getAs<Array>(kAnswer));
 }
 
 }  // namespace qr

@@ -11,6 +11,8 @@
 
 #include "modules/plugin_runner.h"
 #include "platform/child_process.h"
+#include "platform/frame_channel.h"
+#include "platform/shared_page.h"
 #include "values/dictionary.h"
 
 namespace qr {
@@ -22,10 +24,8 @@ class ScannerClient final : public PluginRunner {
   explicit ScannerClient(std::string program, int timeoutSeconds = 0);
   ~ScannerClient() override;
 
-  PluginHandle createInstance(PlugIn& plugin, const UUID& factoryID, const UUID& typeID) override;
-  int32_t queryInterface(PluginHandle instance, const UUID& interfaceID,
-                         PluginHandle* out) override;
-  void releaseInstance(PluginHandle instance) override;
+  InterfaceLoad loadInterface(PlugIn& plugin, const UUID& factoryID, const UUID& typeID,
+                              const UUID& interfaceID) override;
   int32_t getConnectionInfo(PluginHandle interface, Ref<String>* connectionType,
                             Ref<String>* pbmPath) override;
   Ref<Array> createBrowserInfo(PluginHandle interface, const String& connectionType) override;
@@ -34,25 +34,24 @@ class ScannerClient final : public PluginRunner {
   pid_t helperPid() const noexcept { return helper_ ? helper_->pid() : 0; }
 
  private:
-  // What a handle given out stands for, and how to make it again in a fresh helper.
+  // An interface made in a helper, and how to make it again in a fresh one.
   struct Remote {
     uint64_t generation;
     int64_t address;
-    std::string bundle, factory, type, interface;  // interface empty for an instance
+    Ref<Dictionary> loadRequest;
   };
 
-  Ref<Dictionary> call(std::string_view entry, const Ref<MutableDictionary>& request);
-  [[noreturn]] void lose(const std::string& entry, const std::string& what);
   void start();
-  int64_t remoteInstance(const std::string& bundle, const std::string& factory,
-                         const std::string& type);
-  // The helper's address of a handle's interface, brought back after a crash.
+  Ref<Dictionary> call(std::string_view entry, const Dictionary& request);
+  [[noreturn]] void lose(const std::string& what);
+  // The helper's address of a handle's interface, made again after a crash.
   int64_t liveAddress(PluginHandle handle);
-  PluginHandle keep(Remote remote);
 
   std::string program_;
   int timeoutSeconds_;
   std::unique_ptr<ChildProcess> helper_;
+  std::unique_ptr<SharedPage> entryPage_;
+  std::unique_ptr<FrameReader> reader_;
   uint64_t generation_ = 0;
   bool unavailable_ = false;
   std::vector<Remote> handles_;  // handle N is handles_[N - 1]

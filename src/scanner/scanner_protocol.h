@@ -3,24 +3,34 @@
 //
 // The run asks: { "call": <one of the calls below>, arguments... }
 // The helper answers with any number of { "log": "<message>" } (a log line
-// for the run to write as its own) and { "entry": "<name>" } (it is about to
-// enter that part of the plug-in), then one { "done": true, results... }, or
-// { "done": true, "raised": <name>, "reason": <text> } when the plug-in
-// raised the platform exception.
+// for the run to write as its own), then one { "done": true, results... },
+// with "raised" and "reason" when the plug-in raised the platform exception.
+//
+// Besides the socket, the two share one page of memory where the helper
+// notes the entry into plug-in code it is about to make, so that a crash or
+// a hang is told by the entry it happened in without a message per entry.
 #pragma once
 
+#include <array>
 #include <cstddef>
 #include <string_view>
 
 namespace qr::scanner {
 
-// The calls, each named as the entry it makes into the plug-in.
-constexpr std::string_view kCreateInstance = "load";  // then "factory"
-constexpr std::string_view kQueryInterface = "QueryInterface";
-constexpr std::string_view kRelease = "Release";
+// The calls. "load" makes an instance, asks it for the interface and
+// releases it; the other two are the kinds' entries of the same names.
+constexpr std::string_view kLoad = "load";
 constexpr std::string_view kGetConnectionInfo = "GetConnectionInfo";
 constexpr std::string_view kCreateBrowserInfo = "CreateBrowserInfo";
-constexpr std::string_view kFactoryEntry = "factory";
+
+// The entries into plug-in code, by their number in the shared page.
+constexpr std::array<std::string_view, 6> kEntries = {
+    "load", "factory", "QueryInterface", "Release", "GetConnectionInfo", "CreateBrowserInfo"};
+constexpr size_t entryNumber(std::string_view entry) {
+  for (size_t i = 0; i < kEntries.size(); ++i)
+    if (kEntries[i] == entry) return i;
+  return 0;
+}
 
 // Keys.
 constexpr std::string_view kCall = "call";
@@ -28,16 +38,20 @@ constexpr std::string_view kBundle = "bundle";    // the bundle URL's absolute s
 constexpr std::string_view kFactory = "factory";  // UUID strings
 constexpr std::string_view kType = "type";
 constexpr std::string_view kInterface = "interface";
-constexpr std::string_view kHandle = "handle";  // an instance or interface in the helper
+constexpr std::string_view kHandle = "handle";  // an interface in the helper
+constexpr std::string_view kMade = "made";      // an instance was made
 constexpr std::string_view kConnectionType = "connectionType";
 constexpr std::string_view kPBMPath = "pbmPath";
 constexpr std::string_view kStatus = "status";
 constexpr std::string_view kAnswer = "answer";
 constexpr std::string_view kLog = "log";
-constexpr std::string_view kEntry = "entry";
 constexpr std::string_view kDone = "done";
 constexpr std::string_view kRaised = "raised";
 constexpr std::string_view kReason = "reason";
+constexpr std::string_view kReleaseRaised = "releaseRaised";
+
+// The helper finds the shared page at this descriptor, beside the socket.
+constexpr int kEntryPageFd = 4;
 
 // No honest answer comes near this; a larger frame is a broken helper.
 constexpr size_t kMaxFrameSize = size_t(64) << 20;

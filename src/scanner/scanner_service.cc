@@ -13,6 +13,7 @@
 #include "platform/child_process.h"
 #include "platform/frame_channel.h"
 #include "platform/log.h"
+#include "platform/shared_page.h"
 #include "plist/property_list.h"
 #include "scanner/scanner_protocol.h"
 #include "values/boolean.h"
@@ -45,9 +46,10 @@ class Service {
 
  private:
   PlugIn* plugin(const String* bundle);
+  void load(const Dictionary& request, MutableDictionary& reply);
 
   std::map<std::string, Ref<PlugIn>> plugins_;  // kept: their code stays loaded
-  PluginRunner& calls_ = PluginRunner::inProcess();
+  InProcessRunner& calls_ = PluginRunner::inProcess();
 };
 
 PlugIn* Service::plugin(const String* bundle) {
@@ -71,6 +73,19 @@ PluginHandle handleValue(const Dictionary& d) {
   return number ? number->uint64Value() : 0;
 }
 
+void Service::load(const Dictionary& request, MutableDictionary& reply) {
+  PlugIn* module = plugin(request.getAs<String>(kBundle));
+  Ref<UUID> factory = uuidValue(request, kFactory), type = uuidValue(request, kType),
+            interface = uuidValue(request, kInterface);
+  if (!module || !factory || !type || !interface) return;
+  InterfaceLoad load = calls_.loadInterface(*module, *factory, *type, *interface);
+  if (load.instanceMade) reply.set(kMade, Boolean::trueValue());
+  reply.set(kStatus, Number::integer(load.queryResult));
+  reply.set(kHandle, Number::unsignedInteger(load.interface));
+  if (load.raised) reply.set(kRaised, String::make(*load.raised));
+  if (load.releaseRaised) reply.set(kReleaseRaised, String::make(*load.releaseRaised));
+}
+
 Ref<MutableDictionary> Service::answer(const Dictionary& request) {
   auto reply = make<MutableDictionary>();
   reply->set(kDone, Boolean::trueValue());
@@ -78,21 +93,8 @@ Ref<MutableDictionary> Service::answer(const Dictionary& request) {
   std::string call = callName ? callName->utf8() : "";
   PluginHandle handle = handleValue(request);
   try {
-    if (call == kCreateInstance) {
-      PlugIn* module = plugin(request.getAs<String>(kBundle));
-      Ref<UUID> factory = uuidValue(request, kFactory), type = uuidValue(request, kType);
-      void* instance = nullptr;
-      if (module && factory && type)
-        instance = module->createInstance(*factory, *type, [] { sendOne(kEntry, kFactoryEntry); });
-      reply->set(kHandle, Number::unsignedInteger(reinterpret_cast<PluginHandle>(instance)));
-    } else if (call == kQueryInterface) {
-      Ref<UUID> interface = uuidValue(request, kInterface);
-      PluginHandle out = 0;
-      int32_t status = handle && interface ? calls_.queryInterface(handle, *interface, &out) : -1;
-      reply->set(kStatus, Number::integer(status));
-      reply->set(kHandle, Number::unsignedInteger(out));
-    } else if (call == kRelease) {
-      if (handle) calls_.releaseInstance(handle);
+    if (call == kLoad) {
+      load(request, *reply);
     } else if (call == kGetConnectionInfo) {
       Ref<String> type, path;
       // Whatever it stored is sent even when it raises, as a caller here would see it.
@@ -131,13 +133,22 @@ int runScanner(int argc, char** argv) {
   followParent(static_cast<pid_t>(std::atoll(argv[2])));
   // Plug-ins that start programs must not hand them our end of the socket.
   ::fcntl(kSocket, F_SETFD, FD_CLOEXEC);
+  ::fcntl(kEntryPageFd, F_SETFD, FD_CLOEXEC);
   // Chatter reaches the run's standard error line by line.
   std::setvbuf(stdout, nullptr, _IOLBF, 0);
   setLogSink([](std::string_view message) { sendOne(kLog, message); });
 
+  // The run reads the entry we are in from here when we crash or hang.
+  auto entryPage = SharedPage::open(kEntryPageFd);
+  if (!entryPage) return 2;
+  PluginRunner::inProcess().setEntryHook([page = entryPage->bytes()](const char* entry) {
+    page[0] = static_cast<uint8_t>(entryNumber(entry));
+  });
+
   Service service;
+  FrameReader reader(kSocket, kMaxFrameSize);
   std::string payload;
-  while (receiveFrame(kSocket, payload, kMaxFrameSize, -1) == FrameResult::Received) {
+  while (reader.receive(payload, -1) == FrameResult::Received) {
     auto request = cast<Dictionary>(readBinaryPropertyList(payload, Mutability::Immutable));
     if (!request) return 2;
     send(*service.answer(*request));

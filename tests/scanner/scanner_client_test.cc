@@ -13,6 +13,11 @@ using namespace qr;
 
 namespace {
 
+void loadIOModule(ScannerClient& client, PlugIn& plugin) {
+  client.loadInterface(plugin, *UUID::fromString(FIXTURE_FACTORY_A),
+                       *QuarrinModuleFactory::iomTypeID(), *QuarrinModuleFactory::iomIntfID());
+}
+
 TEST(ScannerClient, ABrokenHelperIsALostCall) {
   qrtest::TempDir dir;
   const std::string notAMessage = *writeBinaryPropertyList(*String::make("done"));
@@ -35,8 +40,7 @@ TEST(ScannerClient, ABrokenHelperIsALostCall) {
     chmod(program.c_str(), 0755);
     ScannerClient client(program, 1);
     try {
-      client.createInstance(*plugin, *QuarrinModuleFactory::iomTypeID(),
-                            *QuarrinModuleFactory::iomTypeID());
+      loadIOModule(client, *plugin);
       ADD_FAILURE() << helper.script << " answered";
     } catch (const PluginCallLost& lost) {
       EXPECT_EQ(lost.what, helper.lost) << helper.script;
@@ -50,10 +54,7 @@ TEST(ScannerClient, AMissingHelperIsSaidOnceAndNoModuleIsBlamed) {
   qr::test::CapturedLog log;
   ScannerClient client("/nonexistent/cachewright-scanner", 1);
   auto plugin = PlugIn::create(*qr::test::fixtureURL("c_iom"));
-  for (int i = 0; i < 2; ++i)
-    EXPECT_THROW(client.createInstance(*plugin, *QuarrinModuleFactory::iomTypeID(),
-                                       *QuarrinModuleFactory::iomTypeID()),
-                 Exception);
+  for (int i = 0; i < 2; ++i) EXPECT_THROW(loadIOModule(client, *plugin), Exception);
   EXPECT_EQ(log.count("Cannot start the plug-in helper /nonexistent/cachewright-scanner"), 1u);
 }
 
