@@ -188,6 +188,14 @@ BundleCache& bundleCache() {
   return *cache;
 }
 
+void takeInfoKeys(Bundle::State& state) {
+  const Dictionary* info = state.info.get();
+  state.identifier = stringValue(info, "CFBundleIdentifier");
+  state.shortVersion = stringValue(info, "CFBundleShortVersionString");
+  if (String* region = stringValue(info, "CFBundleDevelopmentRegion"))
+    state.developmentRegion = region->utf8();
+}
+
 std::shared_ptr<const Bundle::State> loadState(const std::string& path, const Layout& layout) {
   auto state = std::make_shared<Bundle::State>();
   state->path = path;
@@ -201,11 +209,7 @@ std::shared_ptr<const Bundle::State> loadState(const std::string& path, const La
     if (file.bytes) state->info = readDictionary(*file.bytes);
     state->racy = state->layout.infoStamp->isRacy();
   }
-  const Dictionary* info = state->info.get();
-  state->identifier = stringValue(info, "CFBundleIdentifier");
-  state->shortVersion = stringValue(info, "CFBundleShortVersionString");
-  if (String* region = stringValue(info, "CFBundleDevelopmentRegion"))
-    state->developmentRegion = region->utf8();
+  takeInfoKeys(*state);
   return state;
 }
 
@@ -249,6 +253,16 @@ Ref<Bundle> Bundle::open(const std::string& path) {
     state = loadState(*key, *layout);
     cache.store(*key, state);
   }
+  return Ref<Bundle>::adopt(new Bundle(std::move(state)));
+}
+
+Ref<Bundle> Bundle::withInfo(const std::string& path, Ref<Dictionary> info) {
+  auto state = std::make_shared<Bundle::State>();
+  state->path = path;
+  state->resourcesPath = path + "/Contents/Resources";
+  state->layout.hasContents = true;
+  state->info = std::move(info);
+  takeInfoKeys(*state);
   return Ref<Bundle>::adopt(new Bundle(std::move(state)));
 }
 

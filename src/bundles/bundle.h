@@ -22,6 +22,9 @@ class Bundle final : public Object {
   // read again only when the file changes.
   static Ref<Bundle> open(const std::string& path);
   static Ref<Bundle> open(const URL& url);
+  // The bundle at path as someone who read its Info dictionary describes it
+  // (a helper process, told by its parent): nothing is read from disk.
+  static Ref<Bundle> withInfo(const std::string& path, Ref<Dictionary> info);
 
   const std::string& path() const noexcept;
   // The Info dictionary, or null when it is missing or unreadable.

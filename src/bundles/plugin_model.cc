@@ -39,7 +39,10 @@ PlugIn::PlugIn(Ref<URL> url, Ref<Bundle> bundle)
     : url_(std::move(url)), bundle_(std::move(bundle)) {}
 
 Ref<PlugIn> PlugIn::create(const URL& bundleURL) {
-  Ref<Bundle> bundle = Bundle::open(bundleURL);
+  return create(bundleURL, Bundle::open(bundleURL));
+}
+
+Ref<PlugIn> PlugIn::create(const URL& bundleURL, Ref<Bundle> bundle) {
   if (!bundle || !bundle->infoDictionary()) return nullptr;
   return Ref<PlugIn>::adopt(new PlugIn(Ref<URL>(const_cast<URL*>(&bundleURL)), std::move(bundle)));
 }

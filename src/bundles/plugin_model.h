@@ -20,6 +20,8 @@ class PlugIn final : public Object {
  public:
   // Null when the URL leads to no directory or one without a readable Info dictionary.
   static Ref<PlugIn> create(const URL& bundleURL);
+  // The same over a bundle already opened or described.
+  static Ref<PlugIn> create(const URL& bundleURL, Ref<Bundle> bundle);
 
   const Ref<URL>& url() const noexcept { return url_; }
   Bundle& bundle() const noexcept { return *bundle_; }

@@ -22,7 +22,8 @@ Ref<String> IOModule::pbmPath() {
 void IOModule::connectionInfo() {
   Ref<String> type, path;
   auto& cache = QuarrinModuleCache::defaultCache();
-  if (!cache.getInfoForIOModule(pluginURL().get(), &type, &path) && loadPluginInterface()) {
+  const FollowUp ask{"GetConnectionInfo"};
+  if (!cache.getInfoForIOModule(pluginURL().get(), &type, &path) && loadPluginInterface(&ask)) {
     auto raised = callPlugin([&] {
       int32_t status = runner().getConnectionInfo(interfaceHandle(), &type, &path);
       // A failed call records nothing, so the next run asks again.

@@ -31,7 +31,7 @@ std::optional<std::string> QuarrinModule::callPlugin(const std::function<void()>
   }
 }
 
-bool QuarrinModule::loadPluginInterface() {
+bool QuarrinModule::loadPluginInterface(const FollowUp* followUp) {
   UUID* type = typeID();
   UUID* interface = interfaceID();
   if (_loadAttempted || _interface || !_factoryID || !type || !interface) return _interface != 0;
@@ -44,8 +44,9 @@ bool QuarrinModule::loadPluginInterface() {
   }
   InterfaceLoad load;
   // The runner reports the plug-in's raises; one that comes back here is the runner's own.
-  if (auto raised = callPlugin(
-          [&] { load = runner().loadInterface(*_pluginRef, *_factoryID, *type, *interface); }))
+  if (auto raised = callPlugin([&] {
+        load = runner().loadInterface(*_pluginRef, *_factoryID, *type, *interface, followUp);
+      }))
     load.raised = raised;
   if (!_lost) {
     _interface = load.interface;

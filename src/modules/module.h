@@ -34,7 +34,8 @@ class QuarrinModule : public Object {
   // Obtains the interface on the first call whose preconditions hold; true
   // when the module has one. Each module creates at most one instance, makes
   // at most one QueryInterface call and releases the instance once.
-  bool loadPluginInterface();
+  // followUp is what the caller asks next when the load succeeds.
+  bool loadPluginInterface(const FollowUp* followUp = nullptr);
   // A call into the plug-in never came back; it is not called again.
   bool lost() const noexcept { return _lost; }
 

@@ -17,7 +17,8 @@ std::unique_ptr<PluginRunner>& installed() {
 }  // namespace
 
 InterfaceLoad InProcessRunner::loadInterface(PlugIn& plugin, const UUID& factoryID,
-                                             const UUID& typeID, const UUID& interfaceID) {
+                                             const UUID& typeID, const UUID& interfaceID,
+                                             const FollowUp*) {
   InterfaceLoad load;
   void* instance = nullptr;
   load.raised = guardPluginCall([&] {

@@ -39,6 +39,13 @@ struct InterfaceLoad {
   std::optional<std::string> releaseRaised;
 };
 
+// What a module asks right after a load that gives it an interface, so that
+// a runner in another process can ask it in the same trip.
+struct FollowUp {
+  std::string_view entry;  // "GetConnectionInfo" or "CreateBrowserInfo"
+  const String* connectionType = nullptr;
+};
+
 class PluginRunner {
  public:
   virtual ~PluginRunner() = default;
@@ -47,7 +54,8 @@ class PluginRunner {
   // interface and releases it: each module does this at most once. Raised
   // platform exceptions are reported in the result.
   virtual InterfaceLoad loadInterface(PlugIn& plugin, const UUID& factoryID, const UUID& typeID,
-                                      const UUID& interfaceID) = 0;
+                                      const UUID& interfaceID,
+                                      const FollowUp* followUp = nullptr) = 0;
   // The platform exception a plug-in raises in these passes through to the caller.
   // What the plug-in stored reaches the outputs even when it raises.
   virtual int32_t getConnectionInfo(PluginHandle interface, Ref<String>* connectionType,
@@ -66,7 +74,7 @@ class PluginRunner {
 class InProcessRunner final : public PluginRunner {
  public:
   InterfaceLoad loadInterface(PlugIn& plugin, const UUID& factoryID, const UUID& typeID,
-                              const UUID& interfaceID) override;
+                              const UUID& interfaceID, const FollowUp* followUp = nullptr) override;
   int32_t getConnectionInfo(PluginHandle interface, Ref<String>* connectionType,
                             Ref<String>* pbmPath) override;
   Ref<Array> createBrowserInfo(PluginHandle interface, const String& connectionType) override;

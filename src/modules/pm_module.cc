@@ -83,7 +83,8 @@ Ref<MutableArray> PMModule::createBrowserInfoForConnectionType(const String& con
     // Even an empty array is a recorded answer.
     answered = result != nullptr;
   }
-  if (!answered && loadPluginInterface()) {
+  const FollowUp ask{"CreateBrowserInfo", &connectionType};
+  if (!answered && loadPluginInterface(&ask)) {
     Ref<Array> answer = askPlugin(connectionType);
     if (lost()) return nullptr;
     if (answer)

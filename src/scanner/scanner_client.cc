@@ -123,6 +123,7 @@ Ref<Dictionary> ScannerClient::call(std::string_view entry, const Dictionary& re
   entryPage_->bytes()[0] = static_cast<uint8_t>(entryNumber(entry));
   if (!sendFrame(helper_->socket(), *bytes)) lose(helper_->finish(kExitGraceMs));
   int64_t deadline = nowMs() + int64_t(timeoutSeconds_) * 1000;
+  uint8_t timedEntry = entryPage_->bytes()[0];
   std::string payload;
   for (;;) {
     int left = static_cast<int>(std::max<int64_t>(deadline - nowMs(), 0));
@@ -132,6 +133,12 @@ Ref<Dictionary> ScannerClient::call(std::string_view entry, const Dictionary& re
       case FrameResult::Closed:
         lose(helper_->finish(kExitGraceMs));
       case FrameResult::TimedOut:
+        // One request may make several entries; each has a limit of its own.
+        if (entryPage_->bytes()[0] != timedEntry) {
+          timedEntry = entryPage_->bytes()[0];
+          deadline = nowMs() + int64_t(timeoutSeconds_) * 1000;
+          continue;
+        }
         helper_->finish(0);
         lose("timed out after " + std::to_string(timeoutSeconds_) + " s");
       case FrameResult::TooLarge:
@@ -151,12 +158,25 @@ Ref<Dictionary> ScannerClient::call(std::string_view entry, const Dictionary& re
 }
 
 InterfaceLoad ScannerClient::loadInterface(PlugIn& plugin, const UUID& factoryID,
-                                           const UUID& typeID, const UUID& interfaceID) {
+                                           const UUID& typeID, const UUID& interfaceID,
+                                           const FollowUp* followUp) {
   auto message = request(kLoad);
   message->set(kBundle, String::make(plugin.url()->absoluteString()));
+  // The helper need not read the Info dictionary again.
+  message->set(kPath, String::make(plugin.bundle().path()));
+  message->set(kInfo, Ref<Dictionary>(plugin.bundle().infoDictionary()));
   message->set(kFactory, String::make(factoryID.string()));
   message->set(kType, String::make(typeID.string()));
   message->set(kInterface, String::make(interfaceID.string()));
+  Ref<Dictionary> again = message->copy();  // to make it again in a fresh helper
+  Ref<MutableDictionary> question;
+  if (followUp) {
+    // Asked in the same trip; the plug-in sees the calls in the same order.
+    question = request(followUp->entry);
+    if (followUp->connectionType) question->set(kConnectionType, followUp->connectionType->copy());
+    message->set(kThen, question);
+  }
+  followUp_ = {};
   Ref<Dictionary> reply = call(kLoad, *message);
   InterfaceLoad load;
   load.instanceMade = reply->get(kMade) != nullptr;
@@ -164,10 +184,22 @@ InterfaceLoad ScannerClient::loadInterface(PlugIn& plugin, const UUID& factoryID
   if (auto* raised = reply->getAs<String>(kRaised)) load.raised = raised->utf8();
   if (auto* raised = reply->getAs<String>(kReleaseRaised)) load.releaseRaised = raised->utf8();
   if (int64_t address = integerValue(*reply, kHandle)) {
-    handles_.push_back({generation_, address, message});
+    handles_.push_back({generation_, address, again});
     load.interface = handles_.size();
   }
+  if (auto* answer = reply->getAs<Dictionary>(kThen))
+    followUp_ = {load.interface, question, Ref<Dictionary>(answer)};
   return load;
+}
+
+Ref<Dictionary> ScannerClient::takeFollowUp(PluginHandle handle, std::string_view entry,
+                                            const String* connectionType) {
+  auto taken = std::exchange(followUp_, {});
+  if (!taken.answer || taken.handle != handle) return nullptr;
+  auto* call = taken.question->getAs<String>(kCall);
+  auto* type = taken.question->getAs<String>(kConnectionType);
+  if (!call || !call->equals(entry) || !equal(type, connectionType)) return nullptr;
+  return taken.answer;
 }
 
 int64_t ScannerClient::liveAddress(PluginHandle handle) {
@@ -185,9 +217,12 @@ int64_t ScannerClient::liveAddress(PluginHandle handle) {
 
 int32_t ScannerClient::getConnectionInfo(PluginHandle interface, Ref<String>* connectionType,
                                          Ref<String>* pbmPath) {
-  auto message = request(kGetConnectionInfo);
-  message->set(kHandle, Number::integer(liveAddress(interface)));
-  Ref<Dictionary> reply = call(kGetConnectionInfo, *message);
+  Ref<Dictionary> reply = takeFollowUp(interface, kGetConnectionInfo, nullptr);
+  if (!reply) {
+    auto message = request(kGetConnectionInfo);
+    message->set(kHandle, Number::integer(liveAddress(interface)));
+    reply = call(kGetConnectionInfo, *message);
+  }
   // What the plug-in stored before raising still counts; the helper sent it along.
   *connectionType = stringValue(*reply, kConnectionType);
   *pbmPath = stringValue(*reply, kPBMPath);
@@ -195,10 +230,14 @@ int32_t ScannerClient::getConnectionInfo(PluginHandle interface, Ref<String>* co
 }
 
 Ref<Array> ScannerClient::createBrowserInfo(PluginHandle interface, const String& connectionType) {
-  auto message = request(kCreateBrowserInfo);
-  message->set(kHandle, Number::integer(liveAddress(interface)));
-  message->set(kConnectionType, connectionType.copy());
-  return Ref<Array>(passRaise(call(kCreateBrowserInfo, *message))->getAs<Array>(kAnswer));
+  Ref<Dictionary> reply = takeFollowUp(interface, kCreateBrowserInfo, &connectionType);
+  if (!reply) {
+    auto message = request(kCreateBrowserInfo);
+    message->set(kHandle, Number::integer(liveAddress(interface)));
+    message->set(kConnectionType, connectionType.copy());
+    reply = call(kCreateBrowserInfo, *message);
+  }
+  return Ref<Array>(passRaise(reply)->getAs<Array>(kAnswer));
 }
 
 }  // namespace qr

@@ -25,7 +25,7 @@ class ScannerClient final : public PluginRunner {
   ~ScannerClient() override;
 
   InterfaceLoad loadInterface(PlugIn& plugin, const UUID& factoryID, const UUID& typeID,
-                              const UUID& interfaceID) override;
+                              const UUID& interfaceID, const FollowUp* followUp) override;
   int32_t getConnectionInfo(PluginHandle interface, Ref<String>* connectionType,
                             Ref<String>* pbmPath) override;
   Ref<Array> createBrowserInfo(PluginHandle interface, const String& connectionType) override;
@@ -41,6 +41,9 @@ class ScannerClient final : public PluginRunner {
     Ref<Dictionary> loadRequest;
   };
 
+  // The answer to the question asked together with a load, when it is this one.
+  Ref<Dictionary> takeFollowUp(PluginHandle handle, std::string_view entry,
+                               const String* connectionType);
   void start();
   Ref<Dictionary> call(std::string_view entry, const Dictionary& request);
   [[noreturn]] void lose(const std::string& what);
@@ -55,6 +58,10 @@ class ScannerClient final : public PluginRunner {
   uint64_t generation_ = 0;
   bool unavailable_ = false;
   std::vector<Remote> handles_;  // handle N is handles_[N - 1]
+  struct {
+    PluginHandle handle = 0;
+    Ref<Dictionary> question, answer;
+  } followUp_;
 };
 
 // The helper program: CACHEWRIGHT_SCANNER, else the installed one, else the

@@ -18,7 +18,8 @@
 namespace qr::scanner {
 
 // The calls. "load" makes an instance, asks it for the interface and
-// releases it; the other two are the kinds' entries of the same names.
+// releases it, and may carry the question the run asks next; the other two
+// are the kinds' entries of the same names.
 constexpr std::string_view kLoad = "load";
 constexpr std::string_view kGetConnectionInfo = "GetConnectionInfo";
 constexpr std::string_view kCreateBrowserInfo = "CreateBrowserInfo";
@@ -35,6 +36,8 @@ constexpr size_t entryNumber(std::string_view entry) {
 // Keys.
 constexpr std::string_view kCall = "call";
 constexpr std::string_view kBundle = "bundle";    // the bundle URL's absolute string
+constexpr std::string_view kPath = "path";        // the bundle's directory
+constexpr std::string_view kInfo = "info";        // its Info dictionary, as the run read it
 constexpr std::string_view kFactory = "factory";  // UUID strings
 constexpr std::string_view kType = "type";
 constexpr std::string_view kInterface = "interface";
@@ -49,6 +52,8 @@ constexpr std::string_view kDone = "done";
 constexpr std::string_view kRaised = "raised";
 constexpr std::string_view kReason = "reason";
 constexpr std::string_view kReleaseRaised = "releaseRaised";
+// In "load": the question to ask once the interface is had, and its answer.
+constexpr std::string_view kThen = "then";
 
 // The helper finds the shared page at this descriptor, beside the socket.
 constexpr int kEntryPageFd = 4;

@@ -45,20 +45,24 @@ class Service {
   Ref<MutableDictionary> answer(const Dictionary& request);
 
  private:
-  PlugIn* plugin(const String* bundle);
+  PlugIn* plugin(const Dictionary& request);
   void load(const Dictionary& request, MutableDictionary& reply);
 
   std::map<std::string, Ref<PlugIn>> plugins_;  // kept: their code stays loaded
   InProcessRunner& calls_ = PluginRunner::inProcess();
 };
 
-PlugIn* Service::plugin(const String* bundle) {
-  if (!bundle) return nullptr;
+PlugIn* Service::plugin(const Dictionary& request) {
+  auto* bundle = request.getAs<String>(kBundle);
+  auto* path = request.getAs<String>(kPath);
+  auto* info = request.getAs<Dictionary>(kInfo);
+  if (!bundle || !path || !info) return nullptr;
   std::string key = bundle->utf8();
   auto found = plugins_.find(key);
   if (found != plugins_.end()) return found->second.get();
   auto url = URL::withString(key);
-  Ref<PlugIn> made = url ? PlugIn::create(*url) : nullptr;
+  Ref<PlugIn> made =
+      url ? PlugIn::create(*url, Bundle::withInfo(path->utf8(), Ref<Dictionary>(info))) : nullptr;
   if (made) plugins_[key] = made;
   return made.get();
 }
@@ -74,7 +78,7 @@ PluginHandle handleValue(const Dictionary& d) {
 }
 
 void Service::load(const Dictionary& request, MutableDictionary& reply) {
-  PlugIn* module = plugin(request.getAs<String>(kBundle));
+  PlugIn* module = plugin(request);
   Ref<UUID> factory = uuidValue(request, kFactory), type = uuidValue(request, kType),
             interface = uuidValue(request, kInterface);
   if (!module || !factory || !type || !interface) return;
@@ -84,6 +88,12 @@ void Service::load(const Dictionary& request, MutableDictionary& reply) {
   reply.set(kHandle, Number::unsignedInteger(load.interface));
   if (load.raised) reply.set(kRaised, String::make(*load.raised));
   if (load.releaseRaised) reply.set(kReleaseRaised, String::make(*load.releaseRaised));
+  auto* then = request.getAs<Dictionary>(kThen);
+  if (then && load.interface && !load.raised) {
+    auto question = then->mutableCopy();
+    question->set(kHandle, Number::unsignedInteger(load.interface));
+    reply.set(kThen, answer(*question));
+  }
 }
 
 Ref<MutableDictionary> Service::answer(const Dictionary& request) {

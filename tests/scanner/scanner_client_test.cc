@@ -15,7 +15,8 @@ namespace {
 
 void loadIOModule(ScannerClient& client, PlugIn& plugin) {
   client.loadInterface(plugin, *UUID::fromString(FIXTURE_FACTORY_A),
-                       *QuarrinModuleFactory::iomTypeID(), *QuarrinModuleFactory::iomIntfID());
+                       *QuarrinModuleFactory::iomTypeID(), *QuarrinModuleFactory::iomIntfID(),
+                       nullptr);
 }
 
 TEST(ScannerClient, ABrokenHelperIsALostCall) {

@@ -51,6 +51,16 @@ TEST(FullRun, WarmRunsLoadNothingABumpReloadsOneModuleAndPathModeAsksAll) {
   EXPECT_EQ(all, kInstalled);
   EXPECT_TRUE(readPropertyListFile(dir / "cache.plist")->isEqual(*fourth));
   EXPECT_TRUE(fourth->isEqual(*third));
+
+  // A store that cannot be written is no "cache stored" (1): it is 2, and the old store stays.
+  std::filesystem::remove(store + ".lock");
+  std::filesystem::create_directory(store + ".lock");
+  const std::string before = qrtest::readText(store);
+  install.setVersion("c_pm", "3.0");
+  auto failed = install.run({});
+  EXPECT_EQ(failed.status, 2) << failed.err;
+  EXPECT_NE(failed.err.find("Cannot open the lock file"), std::string::npos);
+  EXPECT_EQ(qrtest::readText(store), before);
 }
 
 }  // namespace
