@@ -28,11 +28,15 @@ ImageFormat detectFormat(std::string_view bytes) {
 Ref<Data> tiffRepresentationOfImageFile(const std::string& path) {
   StampedFile file = readStampedFile(path, kMaxImageFileSize);
   if (!file.bytes) return nullptr;
-  std::span<const uint8_t> bytes(reinterpret_cast<const uint8_t*>(file.bytes->data()),
-                                 file.bytes->size());
+  return tiffRepresentationOfImageData(*file.bytes);
+}
+
+Ref<Data> tiffRepresentationOfImageData(std::string_view data) {
+  if (data.size() > kMaxImageFileSize) return nullptr;
+  std::span<const uint8_t> bytes(reinterpret_cast<const uint8_t*>(data.data()), data.size());
   RasterImage image;
   bool decoded = false;
-  switch (detectFormat(*file.bytes)) {
+  switch (detectFormat(data)) {
     case ImageFormat::PNG:
       decoded = decodePNG(bytes, image);
       break;
