@@ -60,13 +60,16 @@ bool isExecutable(const std::string& path) { return ::access(path.c_str(), X_OK)
 
 std::string scannerProgramPath() {
   if (const char* path = secure_getenv("CACHEWRIGHT_SCANNER"); path && *path) return path;
-  if (isExecutable(QUARRIN_SCANNER_PATH)) return QUARRIN_SCANNER_PATH;
+  // The helper of the installation the running program belongs to, wherever
+  // its prefix; then the one beside it (the build tree); then the default.
   char self[PATH_MAX];
   ssize_t n = ::readlink("/proc/self/exe", self, sizeof self - 1);
   if (n > 0) {
-    std::string beside(self, size_t(n));
-    beside = beside.substr(0, beside.rfind('/') + 1) + "cachewright-scanner";
-    if (isExecutable(beside)) return beside;
+    std::string folder(self, size_t(n));
+    folder.resize(folder.rfind('/') + 1);
+    for (const std::string& candidate :
+         {folder + QUARRIN_SCANNER_FROM_PROGRAM, folder + "cachewright-scanner"})
+      if (isExecutable(candidate)) return candidate;
   }
   return QUARRIN_SCANNER_PATH;
 }
