@@ -30,3 +30,16 @@ write_basic_package_version_file(${PROJECT_BINARY_DIR}/QuarrinConfigVersion.cmak
 install(FILES ${PROJECT_BINARY_DIR}/QuarrinConfig.cmake
               ${PROJECT_BINARY_DIR}/QuarrinConfigVersion.cmake
         DESTINATION ${QUARRIN_CMAKE_DIR})
+
+# quarrin_add_plugin, for plug-in authors and for this tree's own samples, with
+# the type UUIDs of the public header and the plug-in folder filled in.
+foreach(kind IOM PM PBM)
+  file(STRINGS ${PROJECT_SOURCE_DIR}/include/quarrin/plugin.h line
+       REGEX "^#define QR_${kind}_TYPE_ID \"")
+  string(REGEX MATCH "[0-9A-F-]+\"$" QR_${kind}_TYPE_ID "${line}")
+  string(REPLACE "\"" "" QR_${kind}_TYPE_ID "${QR_${kind}_TYPE_ID}")
+endforeach()
+list(GET QUARRIN_PLUGIN_DIRS 0 QUARRIN_PLUGIN_DIR)
+configure_file(${CMAKE_CURRENT_LIST_DIR}/QuarrinPlugin.cmake.in
+               ${PROJECT_BINARY_DIR}/QuarrinPlugin.cmake @ONLY)
+install(FILES ${PROJECT_BINARY_DIR}/QuarrinPlugin.cmake DESTINATION ${QUARRIN_CMAKE_DIR})
