@@ -4,6 +4,7 @@
 #include <gtest/gtest.h>
 
 #include "support/plist_identity.h"
+#include "values/uuid.h"
 
 using namespace qr;
 using namespace qrtest;
@@ -69,4 +70,17 @@ TEST(MutableArray, IndexBounds) {
   a->set(1, I(3));
   a->removeAt(0);
   EXPECT_TRUE(identical(a.get(), A({I(3)}).get()));
+}
+
+TEST(UUID, ParsesEitherCaseAndRefusesAnythingElse) {
+  const std::pair<const char*, const char*> rows[] = {
+      {"0b1c0f8e-3d2a-4c47-9a0e-6f1d2c3b4a01", "0B1C0F8E-3D2A-4C47-9A0E-6F1D2C3B4A01"},
+      {"AbCdEf01-2345-6789-aBcD-eF0123456789", "ABCDEF01-2345-6789-ABCD-EF0123456789"},
+      {"0B1C0F8E-3D2A-4C47-9A0E-6F1D2C3B4A0G", nullptr},
+      {"0B1C0F8E3D2A-4C47-9A0E-6F1D2C3B4A01-", nullptr},
+      {"0B1C0F8E-3D2A-4C47-9A0E-6F1D2C3B4A0", nullptr}};
+  for (auto [text, canonical] : rows) {
+    auto uuid = UUID::fromString(text);
+    EXPECT_EQ(uuid ? uuid->string() : "", canonical ? canonical : "") << text;
+  }
 }
