@@ -5,6 +5,7 @@
 #include <quarrin/plugin.h>
 
 #include "bundles/c_bridge.h"
+#include "support/installed_sdk.h"
 #include "support/plugin_bundle.h"
 #include "support/plugin_instance.h"
 #include "support/run_program.h"
@@ -14,18 +15,16 @@ namespace {
 
 const char kFactoryID[] = "6A0E3C55-1F2B-4D8E-9C31-70A4B2E5D901";
 
-// sh -ec kBuild sh CMAKE BUILD_DIR DIR: installs into DIR/prefix, builds
+// sh -ec kBuild sh CMAKE PREFIX DIR, with PKG_CONFIG_PATH set: builds
 // DIR/External.so with pkg-config and DIR/build/External.so with the CMake
 // package, and lists the installed headers.
-const char kBuild[] = R"sh(cmake=$1 dir=$3
+const char kBuild[] = R"sh(cmake=$1 prefix=$2 dir=$3
 exec 3>&1 1>&2
-"$cmake" --install "$2" --prefix "$dir/prefix"
-export PKG_CONFIG_PATH="$(dirname "$(find "$dir/prefix" -name quarrin-plugin.pc)")"
 cc -std=c99 -pedantic-errors -Wall -Wextra -Werror -fPIC -shared -fexceptions \
   "$dir/project/external_plugin.c" -o "$dir/External.so" $(pkg-config --cflags --libs quarrin-plugin)
-"$cmake" -S "$dir/project" -B "$dir/build" -DCMAKE_PREFIX_PATH="$dir/prefix"
+"$cmake" -S "$dir/project" -B "$dir/build" -DCMAKE_PREFIX_PATH="$prefix"
 "$cmake" --build "$dir/build"
-find "$dir/prefix/include" -type f >&3
+find "$prefix/include" -type f >&3
 )sh";
 
 TEST(Installation, PkgConfigAndTheCMakePackageEachBuildAPlugInThatLoads) {
@@ -40,11 +39,14 @@ TEST(Installation, PkgConfigAndTheCMakePackageEachBuildAPlugInThatLoads) {
             "set_target_properties(External PROPERTIES PREFIX \"\")\n"
             "target_compile_options(External PRIVATE -fexceptions)\n"
             "target_link_libraries(External PRIVATE Quarrin::quarrin)\n");
+  const qrtest::InstalledSDK& sdk = qrtest::installedSDK();
+  ASSERT_FALSE(sdk.pkgConfigPath.empty()) << sdk.log;
   qrtest::ProgramOptions o;
-  o.args = {"-ec", kBuild, "sh", QUARRIN_CMAKE_COMMAND, QUARRIN_BINARY_DIR, dir.path()};
+  o.args = {"-ec", kBuild, "sh", QUARRIN_CMAKE_COMMAND, sdk.prefix, dir.path()};
+  o.env["PKG_CONFIG_PATH"] = sdk.pkgConfigPath;
   auto r = qrtest::runProgram("/bin/sh", o);
   ASSERT_EQ(r.status, 0) << r.out << r.err;
-  EXPECT_EQ(r.out, dir / "prefix/include/quarrin/plugin.h\n") << "no internal header";
+  EXPECT_EQ(r.out, sdk.prefix + "/include/quarrin/plugin.h\n") << "no internal header";
 
   for (const std::string& library : {dir / "External.so", dir / "build/External.so"}) {
     // A bundle around the shared object, declaring one I/O module factory.
