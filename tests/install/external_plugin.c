@@ -1,12 +1,16 @@
 /* An I/O module written the way an outside author writes one: plain C99,
  * nothing but <quarrin/plugin.h>, built with the flags pkg-config or the
- * CMake package gives. It answers the connection type "Installed". */
+ * CMake package gives. It answers the connection type "Installed"; built with
+ * EXTERNAL_RAISES it raises instead, from C frames, through QrRaise. */
 #include <quarrin/plugin.h>
 #include <string.h>
 
 static int32_t GetConnectionInfo(QrStringRef* connectionType, QrStringRef* pbmPath) {
   static QrStringRef type;
   (void)pbmPath;
+#ifdef EXTERNAL_RAISES
+  QrRaise("ExternalError", "raised from C");
+#endif
   if (!connectionType) QrRaise("ExternalError", "no place for the connection type");
   if (!type) type = QrStringCreateWithUTF8("Installed");
   *connectionType = type;
@@ -34,7 +38,7 @@ static uint32_t Count(void* self) {
 static const QrIUnknownVTbl kUnknown = {NULL, QueryInterface, Count, Count};
 static const QrIUnknownVTbl* const kInstance = &kUnknown;
 
-void* CreateInstance(void* allocator, QrUUIDRef typeID) {
+__attribute__((visibility("default"))) void* CreateInstance(void* allocator, QrUUIDRef typeID) {
   QrUUIDRef iom = QrUUIDCreateFromString(QR_IOM_TYPE_ID);
   bool wanted = QrEqual(typeID, iom);
   (void)allocator;
