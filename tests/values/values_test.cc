@@ -4,6 +4,7 @@
 #include <gtest/gtest.h>
 
 #include "support/plist_identity.h"
+#include "values/url.h"
 #include "values/uuid.h"
 
 using namespace qr;
@@ -82,5 +83,26 @@ TEST(UUID, ParsesEitherCaseAndRefusesAnythingElse) {
   for (auto [text, canonical] : rows) {
     auto uuid = UUID::fromString(text);
     EXPECT_EQ(uuid ? uuid->string() : "", canonical ? canonical : "") << text;
+  }
+}
+
+// File URLs of bundles: escaped on the way in, resolved against a base, and
+// decoded back to the path.
+TEST(URL, FileURLsEscapeResolveAndDecode) {
+  auto base = URL::fileURL("/opt/P r/USB.plugin", true);
+  const struct {
+    Ref<URL> url;
+    const char* absolute;
+    const char* path;
+  } rows[] = {{base, "file:///opt/P%20r/USB.plugin/", "/opt/P r/USB.plugin"},
+              {URL::fileURL("../B\xC3\xA9.plugin", true, base), "file:///opt/P%20r/B%C3%A9.plugin/",
+               "/opt/P r/B\xC3\xA9.plugin"},
+              {URL::withString("file:///x/%4a%4A%2f"), "file:///x/%4a%4A%2f", "/x/JJ"},
+              {URL::withString("file:///x/%4G"), nullptr, nullptr},
+              {URL::withString("http://example.org/a"), "http://example.org/a", nullptr}};
+  for (const auto& r : rows) {
+    EXPECT_EQ(r.url ? r.url->absoluteString() : "", r.absolute ? r.absolute : "");
+    auto path = r.url ? r.url->fileSystemPath() : std::nullopt;
+    EXPECT_EQ(path.value_or(""), r.path ? r.path : "") << (r.absolute ? r.absolute : "");
   }
 }
