@@ -23,3 +23,7 @@ ASAN_OPTIONS=detect_leaks=1 UBSAN_OPTIONS=print_stacktrace=1 \
   run_suite build/sanitize -DCMAKE_BUILD_TYPE=Debug -DQUARRIN_SANITIZE=ON -DQUARRIN_BENCH=OFF
 echo "== fuzz targets (short smoke run)"
 scripts/fuzz.sh 15
+echo "== Debian packages and lintian"
+packages=$(mktemp -d /tmp/quarrin-packages.XXXXXX)
+scripts/build-packages.sh "$packages"
+rm -rf "$packages"

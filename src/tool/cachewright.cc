@@ -3,7 +3,6 @@
 #include <unistd.h>
 
 #include <cstdio>
-#include <cstdlib>
 #include <memory>
 #include <set>
 #include <string>
@@ -72,7 +71,7 @@ int runCachewright(int argc, char** argv, bool isolatePlugins) {
   for (int opt; (opt = getopt(argc, argv, "s?")) != -1;) {
     if (opt != 's') {
       fputs(kCachewrightUsage, stderr);
-      exit(1);
+      return 1;
     }
     streamMode = true;
   }
