@@ -166,8 +166,10 @@ double ownCPU() {
   return t.tv_sec + t.tv_nsec / 1e9;
 }
 
-// Runs cachewright with the arguments; its exit status, or -1.
-int runCachewright(const std::vector<std::string>& args, const std::string& errPath) {
+// Runs body(argv) in a child whose standard streams are /dev/null and errPath;
+// its exit status, or -1.
+int runChild(const std::vector<std::string>& args, const std::string& errPath,
+             const std::function<int(int, char**)>& body) {
   pid_t pid = fork();
   if (pid == 0) {
     int null = open("/dev/null", O_RDWR);
@@ -178,31 +180,26 @@ int runCachewright(const std::vector<std::string>& args, const std::string& errP
     std::vector<char*> argv{const_cast<char*>(QUARRIN_CACHEWRIGHT)};
     for (const auto& a : args) argv.push_back(const_cast<char*>(a.c_str()));
     argv.push_back(nullptr);
-    execv(QUARRIN_CACHEWRIGHT, argv.data());
-    _exit(127);
+    _exit(body(int(argv.size()) - 1, argv.data()));
   }
   int status = 0;
   if (pid < 0 || waitpid(pid, &status, 0) != pid) return -1;
   return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
 }
 
+// cachewright itself, as installed programs run.
+int runCachewright(const std::vector<std::string>& args, const std::string& errPath) {
+  return runChild(args, errPath, [](int, char** argv) {
+    execv(QUARRIN_CACHEWRIGHT, argv);
+    return 127;
+  });
+}
+
 // The run in a forked copy of this program, plug-ins in a helper or not.
 int runForked(const std::vector<std::string>& args, bool isolate, const std::string& errPath) {
-  pid_t pid = fork();
-  if (pid == 0) {
-    int null = open("/dev/null", O_RDWR);
-    int err = open(errPath.c_str(), O_WRONLY | O_CREAT | O_APPEND, 0644);
-    dup2(null, 0);
-    dup2(null, 1);
-    dup2(err, 2);
-    std::vector<char*> argv{const_cast<char*>("cachewright")};
-    for (const auto& a : args) argv.push_back(const_cast<char*>(a.c_str()));
-    argv.push_back(nullptr);
-    _exit(qr::runCachewright(int(argv.size()) - 1, argv.data(), isolate));
-  }
-  int status = 0;
-  if (pid < 0 || waitpid(pid, &status, 0) != pid) return -1;
-  return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+  return runChild(args, errPath, [isolate](int argc, char** argv) {
+    return qr::runCachewright(argc, argv, isolate);
+  });
 }
 
 double median(std::vector<double> v) {
