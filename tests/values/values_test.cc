@@ -73,6 +73,19 @@ TEST(MutableArray, IndexBounds) {
   EXPECT_TRUE(identical(a.get(), A({I(3)}).get()));
 }
 
+// Lookup by UTF-8 text finds keys whatever their storage: narrow, wide, or
+// wide holding only ASCII.
+TEST(Dictionary, TextLookupFindsKeysOfEveryStorage) {
+  auto wideASCII = String::make("\xC3\xA9")->mutableCopy();
+  wideASCII->replace(0, 1, *String::make("Kind"));
+  auto d = make<MutableDictionary>();
+  for (Ref<Object> key : {S("USB"), S("Caf\xC3\xA9 \xE2\x82\xAC"), Ref<Object>(wideASCII)})
+    d->set(key, I(1));
+  for (const char* text : {"USB", "Caf\xC3\xA9 \xE2\x82\xAC", "Kind"})
+    EXPECT_TRUE(d->get(text)) << text;
+  EXPECT_FALSE(d->get("Caf\xC3\xA9"));
+}
+
 TEST(UUID, ParsesEitherCaseAndRefusesAnythingElse) {
   const std::pair<const char*, const char*> rows[] = {
       {"0b1c0f8e-3d2a-4c47-9a0e-6f1d2c3b4a01", "0B1C0F8E-3D2A-4C47-9A0E-6F1D2C3B4A01"},
