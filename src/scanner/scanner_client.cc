@@ -54,6 +54,14 @@ Ref<MutableDictionary> request(std::string_view call) {
   return r;
 }
 
+// The helper runs plug-in code, which could write frames of its own: a line
+// it sends stays one line, so it cannot pass for another log line of the run.
+std::string oneLine(std::string text) {
+  for (char& c : text)
+    if (c == '\n' || c == '\r') c = ' ';
+  return text;
+}
+
 bool isExecutable(const std::string& path) { return ::access(path.c_str(), X_OK) == 0; }
 
 }  // namespace
@@ -154,7 +162,7 @@ Ref<Dictionary> ScannerClient::call(std::string_view entry, const Dictionary& re
       lose("unreadable answer");
     }
     if (auto* line = frame->getAs<String>(kLog))
-      logMessage(line->utf8());
+      logMessage(oneLine(line->utf8()));
     else if (frame->get(kDone))
       return frame;
   }

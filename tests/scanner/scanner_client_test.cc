@@ -21,8 +21,15 @@ void loadIOModule(ScannerClient& client, PlugIn& plugin) {
 
 TEST(ScannerClient, ABrokenHelperIsALostCall) {
   qrtest::TempDir dir;
-  const std::string notAMessage = *writeBinaryPropertyList(*String::make("done"));
-  dir.write("not-a-message", std::string("\0\0\0", 3) + char(notAMessage.size()) + notAMessage);
+  auto frame = [](const Object& value) {
+    std::string bytes = *writeBinaryPropertyList(value);
+    return std::string("\0\0\0", 3) + char(bytes.size()) + bytes;
+  };
+  dir.write("not-a-message", frame(*String::make("done")));
+  // A log line with a line break in it, then a crash.
+  auto forged = make<MutableDictionary>();
+  forged->set("log", String::make("plug-in\ncachewright[1]: forged"));
+  dir.write("forged-log", frame(*forged));
   const struct {
     const char* script;  // what the helper does on fd 3
     const char* lost;    // how the call is reported
@@ -33,8 +40,10 @@ TEST(ScannerClient, ABrokenHelperIsALostCall) {
       {"cat not-a-message >&3; sleep 5", "unreadable answer"},
       {"sleep 5", "timed out after 1 s"},
       {"kill -KILL $$", "SIGKILL"},
+      {"cat forged-log >&3; kill -SEGV $$", "SIGSEGV"},
   };
   auto plugin = PlugIn::create(*qr::test::fixtureURL("c_iom"));
+  qr::test::CapturedLog log;
   for (const auto& helper : kHelpers) {
     std::string program = dir.write(
         "helper", std::string("#!/bin/sh\ncd ") + dir.path() + "\n" + helper.script + "\n");
@@ -49,6 +58,7 @@ TEST(ScannerClient, ABrokenHelperIsALostCall) {
       EXPECT_EQ(client.helperPid(), 0);
     }
   }
+  EXPECT_EQ(log.lines(), std::vector<std::string>{"plug-in cachewright[1]: forged"});
 }
 
 TEST(ScannerClient, AMissingHelperIsSaidOnceAndNoModuleIsBlamed) {
