@@ -1,5 +1,7 @@
 #include "modules/module.h"
 
+#include <utility>
+
 #include "cache/failure_memory.h"
 #include "cache/module_cache.h"
 #include "modules/module_factory.h"
@@ -17,7 +19,8 @@ std::optional<std::string> QuarrinModule::callPlugin(const std::function<void()>
   if (_lost) return std::nullopt;
   try {
     auto raised = guardPluginCall(call);
-    FailureMemory::shared().forget(*_pluginURL);  // it answered
+    // It answered: once is enough to take it off the failure record.
+    if (!std::exchange(_answered, true)) FailureMemory::shared().forget(*_pluginURL);
     return raised;
   } catch (const PluginCallLost& lost) {
     std::string what = "[" + lost.what + "] on call to '" + lost.entry + "'";

@@ -54,6 +54,7 @@ class QuarrinModule : public Object {
   PluginHandle _interface = 0;
   bool _loadAttempted = false;
   bool _lost = false;
+  bool _answered = false;
 };
 
 }  // namespace qr

@@ -196,7 +196,6 @@ void Inspector::ask(PlugIn& plugin, const Kind& kind, Report& report) {
     }
   } else if (kind.type == QuarrinModuleFactory::pmTypeID()) {
     report.printerModule = true;
-    Ref<Bundle> bundle = Bundle::open(*plugin.url());
     for (const auto& type : types_) {
       Ref<Array> answer;
       try {
@@ -205,7 +204,7 @@ void Inspector::ask(PlugIn& plugin, const Kind& kind, Report& report) {
         report.problems.push_back("CreateBrowserInfo raised " + e.name() + " for " + type);
       }
       report.answers.emplace_back(type, answer);
-      if (answer && bundle) checkAnswer(*bundle, type, *answer, report);
+      if (answer) checkAnswer(plugin.bundle(), type, *answer, report);
     }
   }
 }
