@@ -56,9 +56,12 @@ class BinaryReader {
         // than references, and every reference takes at least a byte. Shared
         // immutable containers cost nothing to make, only to walk, so they
         // get more room.
-        nodeBudget_(4 * static_cast<uint64_t>(file.size()) +
-                    (mutability == Mutability::Immutable ? (1u << 20) : 4096)),
-        payloadBudget_(64 * static_cast<uint64_t>(file.size()) + (16u << 20)) {}
+        nodeBudget_(
+            std::min<uint64_t>(4 * static_cast<uint64_t>(file.size()) +
+                                   (mutability == Mutability::Immutable ? (1u << 20) : 4096),
+                               kBudgetCeiling)),
+        payloadBudget_(std::min<uint64_t>(64 * static_cast<uint64_t>(file.size()) + (16u << 20),
+                                          kBudgetCeiling)) {}
 
   Ref<Object> read() {
     if (mutability_ == Mutability::Immutable) return shared(trailer_.topObject, 1);
@@ -67,11 +70,14 @@ class BinaryReader {
 
  private:
   enum State : uint8_t { kUnseen, kBusy, kDone };
+  // Budgets stay below this so that a slot's saturated counts fit 32 bits:
+  // a slot per object, and small slots keep a large file's index compact.
+  static constexpr uint64_t kBudgetCeiling = UINT32_MAX - 1;
   // What is known of one object; a finished immutable object is kept here for sharing.
   struct Slot {
     Ref<Object> value;
-    uint64_t treeSize = 0;   // nodes the value has when walked as a tree
-    uint64_t treeBytes = 0;  // string and data bytes it has when walked as a tree
+    uint32_t treeSize = 0;   // nodes the value has when walked as a tree, at most a budget + 1
+    uint32_t treeBytes = 0;  // its string and data bytes, at most a budget + 1
     uint16_t height = 0;
     State state = kUnseen;
   };
@@ -190,9 +196,10 @@ class BinaryReader {
     s.value = leaf(h);
     if (!s.value) return nullptr;
     s.treeSize = 1;
-    s.treeBytes = h.type == kUTF16String                      ? 2 * h.count
-                  : h.type == kData || h.type == kASCIIString ? h.count
-                                                              : 0;
+    uint64_t bytes = h.type == kUTF16String                      ? 2 * h.count
+                     : h.type == kData || h.type == kASCIIString ? h.count
+                                                                 : 0;
+    s.treeBytes = static_cast<uint32_t>(std::min(bytes, payloadBudget_ + 1));
     s.height = 1;
     s.state = kDone;
     return s.value;
@@ -279,8 +286,8 @@ class BinaryReader {
     if (v && h.type == kDictionary) bytes = std::min(bytes + keyBytes(h), payloadBudget_ + 1);
     if (!v || size > nodeBudget_ || bytes > payloadBudget_) return nullptr;
     s.value = std::move(v);
-    s.treeSize = size;
-    s.treeBytes = bytes;
+    s.treeSize = static_cast<uint32_t>(size);
+    s.treeBytes = static_cast<uint32_t>(bytes);
     s.height = static_cast<uint16_t>(height);
     s.state = kDone;
     return s.value;
