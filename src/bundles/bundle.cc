@@ -9,6 +9,7 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <atomic>
 #include <list>
 #include <mutex>
 #include <unordered_map>
@@ -134,6 +135,29 @@ class BundleCache {
     if (entries_.size() >= sweepAt_) sweep();
   }
 
+  // The snapshot this process has of path, unchecked: for a run scope.
+  StatePtr findAsSeen(const std::string& path) {
+    std::lock_guard<std::mutex> lock(mutex_);
+    auto it = entries_.find(path);
+    if (it == entries_.end()) return nullptr;
+    return it->second.kept ? it->second.kept : it->second.held.lock();
+  }
+
+  void remember(const std::string& path, const FileStamp& stamp, Ref<Dictionary> info) {
+    std::lock_guard<std::mutex> lock(mutex_);
+    remembered_.insert_or_assign(path, Remembered{stamp, std::move(info)});
+  }
+
+  // What an earlier process read from the Info file the layout found, if the
+  // file still has the stamp it had then.
+  Ref<Dictionary> rememberedInfo(const std::string& path, const Layout& layout) {
+    if (!layout.hasContents || !layout.infoStamp) return nullptr;
+    std::lock_guard<std::mutex> lock(mutex_);
+    auto it = remembered_.find(path);
+    if (it == remembered_.end() || !(it->second.stamp == *layout.infoStamp)) return nullptr;
+    return it->second.info;
+  }
+
   void forget(const std::string& path) {
     std::lock_guard<std::mutex> lock(mutex_);
     auto it = entries_.find(path);
@@ -176,11 +200,19 @@ class BundleCache {
     sweepAt_ = std::max(2 * entries_.size(), 2 * kMaxCachedBundles);
   }
 
+  struct Remembered {
+    FileStamp stamp;
+    Ref<Dictionary> info;
+  };
+
   std::mutex mutex_;
+  std::unordered_map<std::string, Remembered> remembered_;
   std::list<std::string> recent_;  // most recent first
   std::unordered_map<std::string, Entry> entries_;
   size_t sweepAt_ = 2 * kMaxCachedBundles;
 };
+
+std::atomic<bool> gInRunScope{false};
 
 BundleCache& bundleCache() {
   // Never destroyed: bundles may still be opened while static objects go.
@@ -196,12 +228,17 @@ void takeInfoKeys(Bundle::State& state) {
     state.developmentRegion = region->utf8();
 }
 
-std::shared_ptr<const Bundle::State> loadState(const std::string& path, const Layout& layout) {
+// The snapshot of the bundle the layout describes; known is what an earlier
+// process read from the same unchanged Info file, when there is one.
+std::shared_ptr<const Bundle::State> loadState(const std::string& path, const Layout& layout,
+                                               Ref<Dictionary> known) {
   auto state = std::make_shared<Bundle::State>();
   state->path = path;
   state->resourcesPath = path + (layout.hasContents ? "/Contents/Resources" : "/Resources");
   state->layout = layout;
-  if (layout.infoStamp) {
+  if (known) {
+    state->info = std::move(known);
+  } else if (layout.infoStamp) {
     StampedFile file = readStampedFile(layout.infoPath, kMaxPropertyListFileSize);
     // The stamp taken with the read describes the bytes parsed; an Info file
     // that cannot be opened keeps the probe's stamp and waits for a change.
@@ -242,19 +279,36 @@ Bundle::Bundle(std::shared_ptr<const State> state) : state_(std::move(state)) {}
 Ref<Bundle> Bundle::open(const std::string& path) {
   std::optional<std::string> key = normalizePath(path);
   if (!key) return nullptr;
-  std::optional<Layout> layout = probe(*key);
   BundleCache& cache = bundleCache();
+  if (gInRunScope)
+    if (std::shared_ptr<const State> seen = cache.findAsSeen(*key))
+      return Ref<Bundle>::adopt(new Bundle(std::move(seen)));
+  std::optional<Layout> layout = probe(*key);
   if (!layout) {
     cache.forget(*key);
     return nullptr;
   }
   std::shared_ptr<const State> state = cache.find(*key, *layout);
   if (!state) {
-    state = loadState(*key, *layout);
+    state = loadState(*key, *layout, cache.rememberedInfo(*key, *layout));
     cache.store(*key, state);
   }
   return Ref<Bundle>::adopt(new Bundle(std::move(state)));
 }
+
+void Bundle::rememberInfo(const std::string& path, const FileStamp& stamp, Ref<Dictionary> info) {
+  if (std::optional<std::string> key = normalizePath(path); key && info)
+    bundleCache().remember(*key, stamp, std::move(info));
+}
+
+std::optional<FileStamp> Bundle::provenInfoStamp() const {
+  const State& s = *state_;
+  if (!s.layout.hasContents || !s.layout.infoStamp || s.racy || !s.info) return std::nullopt;
+  return s.layout.infoStamp;
+}
+
+BundleRunScope::BundleRunScope() { gInRunScope = true; }
+BundleRunScope::~BundleRunScope() { gInRunScope = false; }
 
 Ref<Bundle> Bundle::withInfo(const std::string& path, Ref<Dictionary> info) {
   auto state = std::make_shared<Bundle::State>();

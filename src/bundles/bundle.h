@@ -8,6 +8,7 @@
 #include <string_view>
 #include <vector>
 
+#include "platform/file_stamp.h"
 #include "values/dictionary.h"
 #include "values/object.h"
 #include "values/string.h"
@@ -42,6 +43,15 @@ class Bundle final : public Object {
   // valueIfAbsent when the table or the key is missing.
   Ref<String> localizedString(const String& key, const Ref<String>& valueIfAbsent) const;
 
+  // The stamp of the Info file this snapshot was read from, when a later
+  // stat() showing the same stamp proves the file unchanged: none for a file
+  // modified moments before it was read, or a bundle without Contents/Info.plist.
+  std::optional<FileStamp> provenInfoStamp() const;
+  // What an earlier process read from path's Contents/Info.plist when it had
+  // this stamp. Later opens of path in this process take info instead of
+  // reading the file, for as long as one stat() still shows that stamp.
+  static void rememberInfo(const std::string& path, const FileStamp& stamp, Ref<Dictionary> info);
+
   // The parsed snapshot shared by every bundle object of one path and Info
   // file version (defined in bundle.cc, which keeps the process-wide cache).
   struct State;
@@ -49,6 +59,17 @@ class Bundle final : public Object {
  private:
   explicit Bundle(std::shared_ptr<const State> state);
   std::shared_ptr<const State> state_;
+};
+
+// While one exists, a bundle opened before in this process is opened again as
+// it was then, without a stat(): one run of the tool sees each bundle once,
+// however often it asks for its version. Not nested, not for other threads.
+class BundleRunScope {
+ public:
+  BundleRunScope();
+  ~BundleRunScope();
+  BundleRunScope(const BundleRunScope&) = delete;
+  BundleRunScope& operator=(const BundleRunScope&) = delete;
 };
 
 // The .lproj folder names to try, best first, from LANGUAGE, LC_ALL,

@@ -268,13 +268,12 @@ Ref<MutableDictionary> copyDictionaryPrintingPref(const String& key, int /*domai
   return cast<MutableDictionary>(deepCopy(*value, Mutability::MutableContainersAndLeaves));
 }
 
+Ref<Dictionary> storedDictionaryPrintingPref(const String& key, int /*domain*/) {
+  return cast<Dictionary>(readPreference(key));
+}
+
 bool setPrintingPref(const String& key, const Object& value, int /*domain*/) {
   std::string store = prefsStorePath();
-  Ref<Object> stored = deepCopy(value, Mutability::Immutable);
-  if (!stored) {
-    log("Printing preference %@ not stored in %s: the value is not a property list", &key, store);
-    return false;
-  }
   std::string dir = directoryOf(store);
   if (!makeDirectories(dir)) {
     log("Cannot create the directory %s of the printing-preferences store: %s", dir,
@@ -286,6 +285,15 @@ bool setPrintingPref(const String& key, const Object& value, int /*domain*/) {
   removeStaleTemporaries(store);
 
   StoreContents current = readStore(store);
+  // An equal value is already there: a rewrite would change nothing but
+  // cost a sync of the whole file.
+  if (current.status == StoreContents::Status::Parsed)
+    if (Object* old = current.dictionary->get(key); old && old->isEqual(value)) return true;
+  Ref<Object> stored = deepCopy(value, Mutability::Immutable);
+  if (!stored) {
+    log("Printing preference %@ not stored in %s: the value is not a property list", &key, store);
+    return false;
+  }
   Ref<MutableDictionary> dictionary;
   switch (current.status) {
     case StoreContents::Status::Unreadable:

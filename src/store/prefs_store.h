@@ -22,6 +22,9 @@ Ref<String> copyStringPrintingPref(const String& key, int domain);
 // A new dictionary, mutable down to its leaves, that the caller owns; null when
 // the key holds no dictionary.
 Ref<MutableDictionary> copyDictionaryPrintingPref(const String& key, int domain);
+// The dictionary under the key as the store holds it: immutable and shared,
+// so nothing is copied. Null when the key holds no dictionary.
+Ref<Dictionary> storedDictionaryPrintingPref(const String& key, int domain);
 // Stores a property-list value under the key. False, with one log line, when
 // the store could not be written.
 bool setPrintingPref(const String& key, const Object& value, int domain);

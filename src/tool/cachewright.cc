@@ -7,6 +7,8 @@
 #include <set>
 #include <string>
 
+#include "bundles/bundle.h"
+#include "cache/bundle_stamps.h"
 #include "cache/failure_memory.h"
 #include "cache/module_cache.h"
 #include "modules/module_factory.h"
@@ -32,14 +34,20 @@ constexpr int kMaxDiscoveryDepth = 200;
 bool isPathMode(int argc, char** argv) { return argc == 2 && argv[1][0] == '/'; }
 
 void addURLs(const QuarrinHost& host, std::set<std::string>& urls) {
-  for (const auto& key : host.loadedPlugins()->keys())
-    if (auto* url = cast<URL>(key.get())) urls.insert(url->absoluteString());
+  for (const auto& key : host.loadedPlugins()->keys()) {
+    if (auto* url = cast<URL>(key.get())) {
+      urls.insert(url->absoluteString());
+      BundleStamps::shared().keep(*url);
+    }
+  }
 }
 
 // Finds the installed modules and asks each what it offers; the answers land
 // in the cache. The hosts, and with them every module, go when this returns.
-// Gives the URLs of the modules found.
+// Gives the URLs of the modules found. Each bundle is looked at once: its
+// version cannot change between the questions of one run.
 std::set<std::string> askModules() {
+  BundleRunScope oncePerRun;
   auto pmHost = make<PMHost>();
   auto iomHost = make<IOMHost>();
   auto pbmHost = make<PBMHost>();
@@ -85,10 +93,13 @@ int runCachewright(int argc, char** argv, bool isolatePlugins) {
   // only its own answers. Path mode asks again the modules that failed before.
   if (isolatePlugins) PluginRunner::install(std::make_unique<ScannerClient>(scannerProgramPath()));
   if (isPathMode(argc, argv)) FailureMemory::shared().setConsulted(false);
+  BundleStamps::shared().consult();
   std::set<std::string> installed = askModules();
   PluginRunner::install(nullptr);
   FailureMemory::shared().keepOnly(installed);
   FailureMemory::shared().save();
+  // Stream mode leaves the store to the failure record alone.
+  if (!streamMode) BundleStamps::shared().save();
 
   int status;
   if (streamMode) {

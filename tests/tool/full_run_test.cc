@@ -2,6 +2,9 @@
 // which plug-ins ran and by the cache the runs leave in the store.
 #include <gtest/gtest.h>
 
+#include <fcntl.h>
+#include <sys/stat.h>
+
 #include <set>
 
 #include "support/installation.h"
@@ -61,6 +64,58 @@ TEST(FullRun, WarmRunsLoadNothingABumpReloadsOneModuleAndPathModeAsksAll) {
   EXPECT_EQ(failed.status, 2) << failed.err;
   EXPECT_NE(failed.err.find("Cannot open the lock file"), std::string::npos);
   EXPECT_EQ(qrtest::readText(store), before);
+}
+
+// A bundle's Info dictionary comes from the store's stamp record while the
+// file keeps the stamp it had; any rewrite, even one in the same second at
+// the same size with the times set back, is seen.
+TEST(FullRun, UnchangedInfoFilesAreTakenFromTheRecordAndEveryRewriteIsSeen) {
+  const std::string kRecord = "cachewright bundle stamps";
+  const struct {
+    const char* what;
+    const char* rewriteWith;  // null: the file is left alone
+    const char* expected;     // the version the cache then holds
+  } rows[] = {
+      {"untouched: the record is believed", nullptr, "1.9"},
+      {"another version, same size and times", "1.2", "1.2"},
+      {"the same bytes again, same times", "1.1", "1.1"},
+  };
+  for (const auto& row : rows) {
+    SCOPED_TRACE(row.what);
+    qrtest::Installation install({"c_iom", "c_pm"});
+    const std::string info = install.bundle("c_pm") + "/Contents/Info.plist";
+    const timespec times[2] = {{1'600'000'000, 5}, {1'600'000'000, 5}};
+    auto setVersion = [&](const char* version) {
+      install.setVersion("c_pm", version);
+      ASSERT_EQ(utimensat(AT_FDCWD, info.c_str(), times, 0), 0);
+    };
+    setVersion("1.1");
+    ASSERT_EQ(install.run({}).status, 1);
+    auto record = install.stored(kRecord);
+    auto* kept = record ? record->getAs<Dictionary>(install.bundle("c_pm")) : nullptr;
+    ASSERT_TRUE(kept);
+    EXPECT_TRUE(kept->getAs<Dictionary>("Info")->isEqual(*readPropertyListFile(info)));
+
+    auto prefs = cast<Dictionary>(readPropertyListFile(install.store()))->mutableCopy();
+    auto planted = deepCopy(*prefs->get(kRecord), Mutability::MutableContainersAndLeaves);
+    cast<MutableDictionary>(
+        cast<MutableDictionary>(cast<MutableDictionary>(planted.get())->get(install.bundle("c_pm")))
+            ->get("Info"))
+        ->set("CFBundleShortVersionString", String::make("1.9"));
+    prefs->set(kRecord, planted);
+    ASSERT_TRUE(writePropertyListFile(*prefs, install.store()));
+    if (row.rewriteWith) setVersion(row.rewriteWith);
+
+    ASSERT_EQ(install.run({}).status, 1);
+    auto cache = install.stored("pmcache 5");
+    EXPECT_EQ(describe(cache->getAs<Dictionary>(install.key("c_pm"))->get("Bundle Version")),
+              row.expected);
+  }
+  // A file modified moments ago proves nothing by its stamp: it is not kept.
+  qrtest::Installation fresh({"c_iom", "c_pm"});
+  ASSERT_EQ(fresh.run({}).status, 1);
+  auto record = fresh.stored(kRecord);
+  EXPECT_FALSE(record && record->get(fresh.bundle("c_pm")));
 }
 
 }  // namespace
