@@ -56,10 +56,13 @@ QuarrinModuleCache& QuarrinModuleCache::defaultCache() {
 
 MutableDictionary& QuarrinModuleCache::cacheDict() {
   if (cacheDict_) return *cacheDict_;
-  // The store hands out a fresh copy, mutable down to its leaves: it is the
-  // cache's own already. Only the read-only default resource is copied.
-  Ref<MutableDictionary> loaded =
-      copyDictionaryPrintingPref(*String::make(kCachePrefKey), kCachePrefDomain);
+  // Only the top level is copied from the store's shared, immutable value:
+  // an entry becomes a mutable copy of its own when it is changed (entryFor),
+  // so a run that changes little copies little.
+  Ref<MutableDictionary> loaded;
+  if (Ref<Dictionary> stored =
+          storedDictionaryPrintingPref(*String::make(kCachePrefKey), kCachePrefDomain))
+    loaded = stored->mutableCopy();
   if (!loaded) {
     if (Ref<Object> source = loadDefaultCacheResource())
       loaded = cast<MutableDictionary>(deepCopy(*source, Mutability::MutableContainersAndLeaves));
@@ -104,14 +107,14 @@ Ref<MutableArray> QuarrinModuleCache::browserInfo(const Array& info) {
   return copy;
 }
 
-MutableDictionary* QuarrinModuleCache::currentEntry(const URL* module) {
+Dictionary* QuarrinModuleCache::currentEntry(const URL* module) {
   auto key = cacheKey(module);
   if (!key) return nullptr;
   MutableDictionary& top = cacheDict();
   Object* entry = top.get(*key);
   if (!entry) return nullptr;
   auto version = bundleShortVersion(module);
-  auto* dict = cast<MutableDictionary>(entry);
+  auto* dict = cast<Dictionary>(entry);
   String* stored = dict ? stringValue(dict->get(kBundleVersionKey)) : nullptr;
   if (version && stored && stored->isEqual(*version)) return dict;
   // A stale entry goes whole: every connection type of the module is asked again.
@@ -157,7 +160,7 @@ void QuarrinModuleCache::addInfo(const Array* info, const URL* forPrinterModule,
 
 Ref<MutableArray> QuarrinModuleCache::getInfoForPrinterModule(const URL* module,
                                                               const String* andConnection) {
-  MutableDictionary* entry = currentEntry(module);
+  Dictionary* entry = currentEntry(module);
   if (!entry || !andConnection) return nullptr;
   auto* info = cast<Array>(entry->get(*andConnection));
   if (!info) return nullptr;
@@ -184,7 +187,7 @@ void QuarrinModuleCache::addInfoForIOModule(const URL* module, const String* toC
 
 bool QuarrinModuleCache::getInfoForIOModule(const URL* module, Ref<String>* connection,
                                             Ref<String>* browser) {
-  MutableDictionary* entry = currentEntry(module);
+  Dictionary* entry = currentEntry(module);
   if (!entry) return false;
   if (connection) *connection = stringValue(entry->get(kConnectionTypeKey));
   if (browser) *browser = stringValue(entry->get(kBrowserPathKey));

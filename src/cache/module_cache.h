@@ -61,7 +61,7 @@ class QuarrinModuleCache final : public Object {
   static Ref<String> bundleShortVersion(const URL* module);
   static Ref<MutableArray> browserInfo(const Array& info);
   // The entry of a module when it is current; a stale entry is dropped.
-  MutableDictionary* currentEntry(const URL* module);
+  Dictionary* currentEntry(const URL* module);
   MutableDictionary& entryFor(const URL& module);
 
   Ref<MutableDictionary> cacheDict_;

@@ -96,12 +96,16 @@ int pluginCallTimeoutSeconds() {
   return kDefaultTimeoutSeconds;
 }
 
-ScannerClient::ScannerClient(std::string program, int timeoutSeconds)
-    : program_(std::move(program)), timeoutSeconds_(timeoutSeconds) {}
+ScannerClient::ScannerClient(std::string program, int timeoutSeconds, size_t loadsPerHelper)
+    : program_(std::move(program)),
+      timeoutSeconds_(timeoutSeconds),
+      loadsPerHelper_(std::max<size_t>(loadsPerHelper, 1)) {}
 
 ScannerClient::~ScannerClient() {
-  // Closing the socket ends the helper; one stuck in a plug-in's exit code is killed.
-  if (helper_) helper_->finish(kExitGraceMs);
+  // Closing the socket ends a helper; one stuck in a plug-in's exit code is killed.
+  for (Helper& helper : earlier_)
+    if (helper.process) helper.process->finish(kExitGraceMs);
+  if (current_.process) current_.process->finish(kExitGraceMs);
 }
 
 void ScannerClient::start() {
@@ -109,57 +113,62 @@ void ScannerClient::start() {
   // No module can be asked without it; each says so, and none is remembered as failed.
   if (unavailable_) throw Exception("QrScannerUnavailable", program_);
   std::string error = "no shared memory";
-  entryPage_ = SharedPage::create();
-  if (entryPage_) helper_ = ChildProcess::start(program_, &error, entryPage_->fd(), kEntryPageFd);
-  if (!helper_) {
+  current_ = {};
+  current_.entryPage = SharedPage::create();
+  if (current_.entryPage)
+    current_.process =
+        ChildProcess::start(program_, &error, current_.entryPage->fd(), kEntryPageFd);
+  if (!current_.process) {
     unavailable_ = true;
     log("Cannot start the plug-in helper %s: %s", program_, error);
     throw Exception("QrScannerUnavailable", program_);
   }
-  reader_ = std::make_unique<FrameReader>(helper_->socket(), kMaxFrameSize);
-  ++generation_;
+  current_.reader = std::make_unique<FrameReader>(current_.process->socket(), kMaxFrameSize);
+  current_.generation = ++generation_;
 }
 
-void ScannerClient::lose(const std::string& what) {
-  size_t entry = entryPage_->bytes()[0];
-  helper_.reset();
-  reader_.reset();
+void ScannerClient::lose(Helper& helper, const std::string& what) {
+  size_t entry = helper.entryPage->bytes()[0];
+  helper.process.reset();
+  helper.reader.reset();
   throw PluginCallLost{what, std::string(kEntries[entry < kEntries.size() ? entry : 0])};
 }
 
-Ref<Dictionary> ScannerClient::call(std::string_view entry, const Dictionary& request) {
-  if (!helper_) start();
+Ref<Dictionary> ScannerClient::call(Helper& helper, std::string_view entry,
+                                    const Dictionary& request) {
   auto bytes = writeBinaryPropertyList(request);
   if (!bytes) throw Exception("QrScannerRequest", "a question that cannot be sent");
-  entryPage_->bytes()[0] = static_cast<uint8_t>(entryNumber(entry));
-  if (!sendFrame(helper_->socket(), *bytes)) lose(helper_->finish(kExitGraceMs));
+  volatile uint8_t* entryByte = helper.entryPage->bytes();
+  *entryByte = static_cast<uint8_t>(entryNumber(entry));
+  ChildProcess& process = *helper.process;
+  if (!sendFrame(process.socket(), *bytes)) lose(helper, process.finish(kExitGraceMs));
   int64_t deadline = nowMs() + int64_t(timeoutSeconds_) * 1000;
-  uint8_t timedEntry = entryPage_->bytes()[0];
+  uint8_t timedEntry = *entryByte;
   std::string payload;
   for (;;) {
     int left = static_cast<int>(std::max<int64_t>(deadline - nowMs(), 0));
-    switch (reader_->receive(payload, left)) {
+    switch (helper.reader->receive(payload, left)) {
       case FrameResult::Received:
         break;
       case FrameResult::Closed:
-        lose(helper_->finish(kExitGraceMs));
+        lose(helper, process.finish(kExitGraceMs));
       case FrameResult::TimedOut:
         // One request may make several entries; each has a limit of its own.
-        if (entryPage_->bytes()[0] != timedEntry) {
-          timedEntry = entryPage_->bytes()[0];
+        if (*entryByte != timedEntry) {
+          timedEntry = *entryByte;
           deadline = nowMs() + int64_t(timeoutSeconds_) * 1000;
           continue;
         }
-        helper_->finish(0);
-        lose("timed out after " + std::to_string(timeoutSeconds_) + " s");
+        process.finish(0);
+        lose(helper, "timed out after " + std::to_string(timeoutSeconds_) + " s");
       case FrameResult::TooLarge:
-        helper_->finish(0);
-        lose("unreadable answer");
+        process.finish(0);
+        lose(helper, "unreadable answer");
     }
     auto frame = cast<Dictionary>(readBinaryPropertyList(payload, Mutability::Immutable));
     if (!frame) {
-      helper_->finish(0);
-      lose("unreadable answer");
+      process.finish(0);
+      lose(helper, "unreadable answer");
     }
     if (auto* line = frame->getAs<String>(kLog))
       logMessage(oneLine(line->utf8()));
@@ -188,14 +197,20 @@ InterfaceLoad ScannerClient::loadInterface(PlugIn& plugin, const UUID& factoryID
     message->set(kThen, question);
   }
   followUp_ = {};
-  Ref<Dictionary> reply = call(kLoad, *message);
+  if (current_.process && current_.loads >= loadsPerHelper_) {
+    earlier_.push_back(std::move(current_));
+    current_ = {};
+  }
+  if (!current_.process) start();
+  ++current_.loads;
+  Ref<Dictionary> reply = call(current_, kLoad, *message);
   InterfaceLoad load;
   load.instanceMade = reply->get(kMade) != nullptr;
   load.queryResult = static_cast<int32_t>(integerValue(*reply, kStatus));
   if (auto* raised = reply->getAs<String>(kRaised)) load.raised = raised->utf8();
   if (auto* raised = reply->getAs<String>(kReleaseRaised)) load.releaseRaised = raised->utf8();
   if (int64_t address = integerValue(*reply, kHandle)) {
-    handles_.push_back({generation_, address, again});
+    handles_.push_back({current_.generation, address, again});
     load.interface = handles_.size();
   }
   if (auto* answer = reply->getAs<Dictionary>(kThen))
@@ -213,17 +228,23 @@ Ref<Dictionary> ScannerClient::takeFollowUp(PluginHandle handle, std::string_vie
   return taken.answer;
 }
 
-int64_t ScannerClient::liveAddress(PluginHandle handle) {
-  if (handle == 0 || handle > handles_.size()) return 0;
-  if (!helper_) start();
-  Remote& remote = handles_[handle - 1];
-  if (remote.generation != generation_) {
-    // Another module took the helper down: make this one's interface again
-    // in the fresh helper, the way it was made the first time.
-    remote.address = integerValue(*call(kLoad, *remote.loadRequest), kHandle);
-    remote.generation = generation_;
+std::pair<ScannerClient::Helper*, int64_t> ScannerClient::liveAddress(PluginHandle handle) {
+  if (handle == 0 || handle > handles_.size()) {
+    if (!current_.process) start();
+    return {&current_, 0};
   }
-  return remote.address;
+  Remote& remote = handles_[handle - 1];
+  if (current_.process && current_.generation == remote.generation)
+    return {&current_, remote.address};
+  for (Helper& helper : earlier_)
+    if (helper.process && helper.generation == remote.generation) return {&helper, remote.address};
+  // Another module took its helper down: make this one's interface again in
+  // the current helper, the way it was made the first time.
+  if (!current_.process) start();
+  ++current_.loads;
+  remote.address = integerValue(*call(current_, kLoad, *remote.loadRequest), kHandle);
+  remote.generation = current_.generation;
+  return {&current_, remote.address};
 }
 
 int32_t ScannerClient::getConnectionInfo(PluginHandle interface, Ref<String>* connectionType,
@@ -231,8 +252,9 @@ int32_t ScannerClient::getConnectionInfo(PluginHandle interface, Ref<String>* co
   Ref<Dictionary> reply = takeFollowUp(interface, kGetConnectionInfo, nullptr);
   if (!reply) {
     auto message = request(kGetConnectionInfo);
-    message->set(kHandle, Number::integer(liveAddress(interface)));
-    reply = call(kGetConnectionInfo, *message);
+    auto [helper, address] = liveAddress(interface);
+    message->set(kHandle, Number::integer(address));
+    reply = call(*helper, kGetConnectionInfo, *message);
   }
   // What the plug-in stored before raising still counts; the helper sent it along.
   *connectionType = stringValue(*reply, kConnectionType);
@@ -244,9 +266,10 @@ Ref<Array> ScannerClient::createBrowserInfo(PluginHandle interface, const String
   Ref<Dictionary> reply = takeFollowUp(interface, kCreateBrowserInfo, &connectionType);
   if (!reply) {
     auto message = request(kCreateBrowserInfo);
-    message->set(kHandle, Number::integer(liveAddress(interface)));
+    auto [helper, address] = liveAddress(interface);
+    message->set(kHandle, Number::integer(address));
     message->set(kConnectionType, connectionType.copy());
-    reply = call(kCreateBrowserInfo, *message);
+    reply = call(*helper, kCreateBrowserInfo, *message);
   }
   return Ref<Array>(passRaise(reply)->getAs<Array>(kAnswer));
 }

@@ -20,8 +20,11 @@ namespace qr {
 class ScannerClient final : public PluginRunner {
  public:
   // timeoutSeconds bounds each call; 0 takes pluginCallTimeoutSeconds() when
-  // the helper is first needed.
-  explicit ScannerClient(std::string program, int timeoutSeconds = 0);
+  // the helper is first needed. A helper makes loadsPerHelper interfaces
+  // before the next one takes over.
+  static constexpr size_t kLoadsPerHelper = 400;
+  explicit ScannerClient(std::string program, int timeoutSeconds = 0,
+                         size_t loadsPerHelper = kLoadsPerHelper);
   ~ScannerClient() override;
 
   InterfaceLoad loadInterface(PlugIn& plugin, const UUID& factoryID, const UUID& typeID,
@@ -30,10 +33,18 @@ class ScannerClient final : public PluginRunner {
                             Ref<String>* pbmPath) override;
   Ref<Array> createBrowserInfo(PluginHandle interface, const String& connectionType) override;
 
-  // The helper's process id, or 0 while none runs; for tests.
-  pid_t helperPid() const noexcept { return helper_ ? helper_->pid() : 0; }
+  // The current helper's process id, or 0 while none runs; for tests.
+  pid_t helperPid() const noexcept { return current_.process ? current_.process->pid() : 0; }
 
  private:
+  // One helper process. Each start has a generation of its own.
+  struct Helper {
+    std::unique_ptr<ChildProcess> process;
+    std::unique_ptr<SharedPage> entryPage;
+    std::unique_ptr<FrameReader> reader;
+    uint64_t generation = 0;
+    size_t loads = 0;
+  };
   // An interface made in a helper, and how to make it again in a fresh one.
   struct Remote {
     uint64_t generation;
@@ -45,16 +56,21 @@ class ScannerClient final : public PluginRunner {
   Ref<Dictionary> takeFollowUp(PluginHandle handle, std::string_view entry,
                                const String* connectionType);
   void start();
-  Ref<Dictionary> call(std::string_view entry, const Dictionary& request);
-  [[noreturn]] void lose(const std::string& what);
-  // The helper's address of a handle's interface, made again after a crash.
-  int64_t liveAddress(PluginHandle handle);
+  Ref<Dictionary> call(Helper& helper, std::string_view entry, const Dictionary& request);
+  [[noreturn]] void lose(Helper& helper, const std::string& what);
+  // The helper holding a handle's interface and its address there; an
+  // interface whose helper was lost is made again in the current one.
+  std::pair<Helper*, int64_t> liveAddress(PluginHandle handle);
 
   std::string program_;
   int timeoutSeconds_;
-  std::unique_ptr<ChildProcess> helper_;
-  std::unique_ptr<SharedPage> entryPage_;
-  std::unique_ptr<FrameReader> reader_;
+  size_t loadsPerHelper_;
+  // New interfaces are made in the current helper. After a few hundred the
+  // next helper takes over, since the loader of one process slows with every
+  // object it holds; the earlier helpers stay, serving the interfaces they
+  // made, so no plug-in sees its factory called twice.
+  Helper current_;
+  std::vector<Helper> earlier_;
   uint64_t generation_ = 0;
   bool unavailable_ = false;
   std::vector<Remote> handles_;  // handle N is handles_[N - 1]

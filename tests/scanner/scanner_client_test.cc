@@ -13,10 +13,12 @@ using namespace qr;
 
 namespace {
 
-void loadIOModule(ScannerClient& client, PlugIn& plugin) {
-  client.loadInterface(plugin, *UUID::fromString(FIXTURE_FACTORY_A),
-                       *QuarrinModuleFactory::iomTypeID(), *QuarrinModuleFactory::iomIntfID(),
-                       nullptr);
+PluginHandle loadIOModule(ScannerClient& client, PlugIn& plugin) {
+  return client
+      .loadInterface(plugin, *UUID::fromString(FIXTURE_FACTORY_A),
+                     *QuarrinModuleFactory::iomTypeID(), *QuarrinModuleFactory::iomIntfID(),
+                     nullptr)
+      .interface;
 }
 
 TEST(ScannerClient, ABrokenHelperIsALostCall) {
@@ -67,6 +69,29 @@ TEST(ScannerClient, AMissingHelperIsSaidOnceAndNoModuleIsBlamed) {
   auto plugin = PlugIn::create(*qr::test::fixtureURL("c_iom"));
   for (int i = 0; i < 2; ++i) EXPECT_THROW(loadIOModule(client, *plugin), Exception);
   EXPECT_EQ(log.count("Cannot start the plug-in helper /nonexistent/cachewright-scanner"), 1u);
+}
+
+// The next helper takes over new loads while the earlier one keeps serving
+// what it made: no plug-in sees its factory twice.
+TEST(ScannerClient, HelpersTakeTurnsAndEarlierOnesKeepTheirInterfaces) {
+  qr::test::FixtureCalls calls;
+  ScannerClient client(QUARRIN_BINARY_DIR "/src/cachewright-scanner", 5, 2);
+  auto plugin = PlugIn::create(*qr::test::fixtureURL("c_iom"));
+  std::vector<PluginHandle> handles;
+  std::vector<pid_t> pids;
+  for (int i = 0; i < 3; ++i) {
+    handles.push_back(loadIOModule(client, *plugin));
+    pids.push_back(client.helperPid());
+  }
+  EXPECT_EQ(pids[0], pids[1]);
+  EXPECT_NE(pids[1], pids[2]);
+  for (PluginHandle handle : handles) {
+    Ref<String> type, path;
+    EXPECT_EQ(client.getConnectionInfo(handle, &type, &path), 0);
+    EXPECT_TRUE(type);
+  }
+  EXPECT_EQ(calls.count("c_iom create"), 3u);
+  EXPECT_EQ(calls.count("c_iom GetConnectionInfo"), 3u);
 }
 
 }  // namespace
