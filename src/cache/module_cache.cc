@@ -207,23 +207,23 @@ bool QuarrinModuleCache::writeCache() {
 }
 
 bool QuarrinModuleCache::writeToFd(int fd) {
-  auto xml = writeXMLPropertyList(cacheDict());
-  if (!xml) return false;
-  return writeAll(fd, *xml);
+  return writeXMLPropertyList(cacheDict(),
+                              [fd](std::string_view piece) { return writeAll(fd, piece); });
 }
 
 bool QuarrinModuleCache::readFromFd(int fd) {
-  std::string bytes;
-  readAll(fd, bytes);  // a read error ends the input; what came before still counts
-  if (bytes.empty()) return dirty_;
-  auto value = readPropertyList(bytes, Mutability::MutableContainersAndLeaves);
+  InputBuffer input;
+  input.readAll(fd);  // a read error ends the input; what came before still counts
+  if (input.view().empty()) return dirty_;
+  auto value = readPropertyList(input.view(), Mutability::Immutable);
   if (!value) return dirty_;
-  auto dict = cast<MutableDictionary>(value);
+  auto* dict = cast<Dictionary>(value.get());
   if (!dict) {
     log("Ignoring a cache on standard input that is not a dictionary.");
     return dirty_;
   }
-  setCacheDict(dict);
+  // As with the store: entries become mutable copies only when changed.
+  setCacheDict(dict->mutableCopy());
   return dirty_;
 }
 

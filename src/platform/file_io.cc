@@ -27,6 +27,27 @@ bool readAll(int fd, std::string& out) {
   }
 }
 
+bool InputBuffer::readAll(int fd) {
+  struct stat st;
+  size_t expected = ::fstat(fd, &st) == 0 && S_ISREG(st.st_mode) && st.st_size > 0
+                        ? static_cast<size_t>(st.st_size)
+                        : 0;
+  for (;;) {
+    if (capacity_ - size_ < (expected ? 1 : 4096)) {
+      size_t grown = capacity_ ? 2 * capacity_ : expected + 1 + (expected ? 0 : 65536);
+      char* p = static_cast<char*>(std::realloc(data_.get(), grown));
+      if (!p) return false;
+      data_.release();
+      data_.reset(p);
+      capacity_ = grown;
+    }
+    ssize_t n = ::read(fd, data_.get() + size_, capacity_ - size_);
+    if (n > 0) size_ += static_cast<size_t>(n);
+    if (n == 0) return true;
+    if (n < 0 && errno != EINTR) return false;
+  }
+}
+
 bool writeAll(int fd, std::string_view bytes) {
   while (!bytes.empty()) {
     ssize_t n = ::write(fd, bytes.data(), bytes.size());

@@ -1,6 +1,8 @@
 // Whole-file reads and writes, and descriptor I/O that survives EINTR and short counts.
 #pragma once
 
+#include <cstdlib>
+#include <memory>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -15,6 +17,24 @@ bool writeFile(const std::string& path, std::string_view bytes);
 bool writeAll(int fd, std::string_view bytes);
 // Reads until end of file; false on an error other than EINTR (what was read stays in out).
 bool readAll(int fd, std::string& out);
+
+// Bytes read to the end of a descriptor into memory never written before:
+// for inputs of many megabytes, where zeroing a string first would touch
+// every page twice.
+class InputBuffer {
+ public:
+  // False on an error other than EINTR; what was read stays.
+  bool readAll(int fd);
+  std::string_view view() const noexcept { return {data_.get(), size_}; }
+
+ private:
+  struct Free {
+    void operator()(char* p) const noexcept { std::free(p); }
+  };
+  std::unique_ptr<char, Free> data_;
+  size_t size_ = 0;
+  size_t capacity_ = 0;
+};
 
 bool isDirectory(const std::string& path);
 bool isReadableFile(const std::string& path);

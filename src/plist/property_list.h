@@ -5,6 +5,7 @@
 // the binary form.
 #pragma once
 
+#include <functional>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -32,6 +33,10 @@ Ref<Object> readTextPropertyList(std::string_view bytes, Mutability mutability);
 // The canonical XML form; none when the value holds anything that is not a
 // property-list value or a string that XML 1.0 cannot carry.
 std::optional<std::string> writeXMLPropertyList(const Object& value);
+// The same text handed to sink in pieces, for output that goes straight to a
+// file. Nothing reaches the sink for a value that cannot be written; false
+// then, or when the sink returns false.
+bool writeXMLPropertyList(const Object& value, const std::function<bool(std::string_view)>& sink);
 // Whether writeXMLPropertyList would write the value, without writing it.
 bool canWriteXMLPropertyList(const Object& value);
 // The binary "bplist00" form; none when the value holds anything that is not a property-list value.

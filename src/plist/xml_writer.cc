@@ -14,6 +14,8 @@
 #include <cmath>
 #include <cstdint>
 #include <cstring>
+#include <functional>
+#include <memory>
 #include <vector>
 
 #include "plist/property_list.h"
@@ -113,6 +115,61 @@ class Printer {
   char* p_;
   char* end_;
   bool overflow_ = false;
+};
+
+// Writes through a buffer of its own into a sink, for outputs that go
+// straight to a file: no room for the whole text is ever made.
+class Streamer {
+ public:
+  static constexpr bool kSortsKeys = true;
+  explicit Streamer(const std::function<bool(std::string_view)>& sink)
+      : sink_(sink), buffer_(new char[kChunk]), p_(buffer_.get()) {}
+  void put(std::string_view s) {
+    if (!room(s.size())) {
+      if (ok_) ok_ = sink_(s);
+      return;
+    }
+    std::memcpy(p_, s.data(), s.size());
+    p_ += s.size();
+  }
+  void tabs(size_t n) {  // at most the nesting limit
+    if (room(n)) {
+      std::memset(p_, '\t', n);
+      p_ += n;
+    }
+  }
+  void base64(const uint8_t* bytes, size_t n) {
+    if (room(xmlplist::base64Length(n))) p_ = xmlplist::encodeBase64(bytes, n, p_);
+  }
+  void utf8(uint32_t c) {
+    if (!room(4)) return;
+    Printer printer(p_, p_ + 4);
+    printer.utf8(c);
+    p_ += c < 0x800 ? 2 : c < 0x10000 ? 3 : 4;
+  }
+  // False when the sink refused any part.
+  bool finish() {
+    flush();
+    return ok_;
+  }
+
+ private:
+  // Larger than any one piece the walker puts, but for long text.
+  static constexpr size_t kChunk = size_t(1) << 20;
+  // Whether n more bytes fit, after flushing if need be.
+  bool room(size_t n) {
+    if (n <= size_t(buffer_.get() + kChunk - p_)) return true;
+    flush();
+    return n <= kChunk;
+  }
+  void flush() {
+    if (ok_ && p_ != buffer_.get()) ok_ = sink_({buffer_.get(), size_t(p_ - buffer_.get())});
+    p_ = buffer_.get();
+  }
+  const std::function<bool(std::string_view)>& sink_;
+  std::unique_ptr<char[]> buffer_;
+  char* p_;
+  bool ok_ = true;
 };
 
 template <class Out>
@@ -343,6 +400,21 @@ std::optional<std::string> writeXMLPropertyList(const Object& value) {
     return out;
   } catch (const std::bad_alloc&) {
     return std::nullopt;
+  }
+}
+
+bool writeXMLPropertyList(const Object& value, const std::function<bool(std::string_view)>& sink) {
+  try {
+    // Checked whole first, so that nothing reaches the sink for a value that
+    // cannot be written.
+    if (!canWriteXMLPropertyList(value)) return false;
+    Streamer streamer(sink);
+    streamer.put(kHead);
+    if (!Walker<Streamer>(streamer).value(value, 1)) return false;
+    streamer.put(kTail);
+    return streamer.finish();
+  } catch (const std::bad_alloc&) {
+    return false;
   }
 }
 
