@@ -249,7 +249,12 @@ bool String::isEqual(const Object& other) const noexcept {
 }
 
 size_t String::hash() const noexcept {
-  return wide_ ? hashCodeUnits(wide()) : hashCodeUnits(narrow());
+  size_t h = hash_.load(std::memory_order_relaxed);
+  if (h == 0) {
+    h = wide_ ? hashCodeUnits(wide()) : hashCodeUnits(narrow());
+    hash_.store(h, std::memory_order_relaxed);
+  }
+  return h;
 }
 
 void MutableString::widen() {

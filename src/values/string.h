@@ -3,6 +3,7 @@
 // observe except through the narrow() fast path.
 #pragma once
 
+#include <atomic>
 #include <string>
 #include <string_view>
 
@@ -64,12 +65,16 @@ class String : public Object {
     data_ = data;
     length_ = static_cast<uint32_t>(length);
     wide_ = wide;
+    hash_.store(0, std::memory_order_relaxed);
   }
 
  private:
-  const void* data_ = "";
   uint32_t length_ = 0;
   bool wide_ = false;
+  const void* data_ = "";
+  // Computed on first use: a key shared by many dictionaries (as readers
+  // share them) is hashed once. 0 means not yet.
+  mutable std::atomic<size_t> hash_{0};
 };
 
 class MutableString final : public String {
