@@ -13,10 +13,12 @@
 #include <cerrno>
 #include <cstdlib>
 #include <cstring>
+#include <memory>
 #include <mutex>
 #include <set>
 
 #include "platform/file_io.h"
+#include "platform/file_stamp.h"
 #include "platform/log.h"
 #include "plist/property_list.h"
 #include "values/deep_copy.h"
@@ -67,28 +69,51 @@ bool makeDirectories(const std::string& dir) {
 
 // The last store this process parsed, with the bytes it came from. One run
 // reads the store several times (the discovery switch, the module cache, the
-// writer's fresh read under the lock), and a store holding the cache of
-// thousands of modules takes far longer to parse than to read: a read that
-// finds the same bytes takes the dictionary parsed before. Equal bytes are
-// the test, not file stamps, so no change to the file can go unseen.
+// records, the writer's fresh read under the lock), and a store holding the
+// cache of thousands of modules takes far longer to parse than to read.
+// A store whose stamp is the one it had when parsed, and was not modified
+// moments before, is taken as unchanged without a read (any write moves the
+// status-change time, and the store is replaced, never edited, by writers);
+// otherwise a read that finds the same bytes takes the dictionary parsed before.
 class ParsedStoreMemo {
  public:
-  Ref<Dictionary> find(const std::string& path, const std::string& bytes) {
+  struct Hit {
+    Ref<Dictionary> dictionary;  // immutable, so it can be handed to every reader
+    std::shared_ptr<const std::string> bytes;
+  };
+  Hit findByStamp(const std::string& path, const FileStamp& stamp) {
     std::lock_guard<std::mutex> lock(mutex_);
-    return path == path_ && bytes == bytes_ ? dictionary_ : nullptr;
+    if (path != path_ || !stampProves_ || !(stamp == stamp_)) return {};
+    return {dictionary_, bytes_};
   }
-  void remember(const std::string& path, const std::string& bytes, Ref<Dictionary> dictionary) {
+  Hit findByBytes(const std::string& path, std::string_view bytes, const FileStamp& stamp) {
+    std::lock_guard<std::mutex> lock(mutex_);
+    if (path != path_ || !bytes_ || bytes != *bytes_) return {};
+    restamp(stamp);
+    return {dictionary_, bytes_};
+  }
+  void remember(const std::string& path, std::string_view bytes, const FileStamp& stamp,
+                Ref<Dictionary> dictionary) {
+    auto kept = std::make_shared<const std::string>(bytes);
     std::lock_guard<std::mutex> lock(mutex_);
     path_ = path;
-    bytes_ = bytes;
+    bytes_ = std::move(kept);
     dictionary_ = std::move(dictionary);
+    restamp(stamp);
   }
 
  private:
+  void restamp(const FileStamp& stamp) {
+    stamp_ = stamp;
+    stampProves_ = !stamp.isRacy();
+  }
+
   std::mutex mutex_;
   std::string path_;
-  std::string bytes_;
-  Ref<Dictionary> dictionary_;  // immutable, so it can be handed to every reader
+  std::shared_ptr<const std::string> bytes_;
+  FileStamp stamp_;
+  bool stampProves_ = false;
+  Ref<Dictionary> dictionary_;
 };
 
 ParsedStoreMemo& parsedStoreMemo() {
@@ -99,13 +124,22 @@ ParsedStoreMemo& parsedStoreMemo() {
 struct StoreContents {
   enum class Status { Missing, Parsed, Corrupt, Unreadable } status = Status::Missing;
   int error = 0;
-  std::string bytes;
+  std::string_view bytes;  // in read or in remembered
+  InputBuffer read;
+  std::shared_ptr<const std::string> remembered;
   Ref<Dictionary> dictionary;  // immutable
 };
 
 StoreContents readStore(const std::string& path) {
   StoreContents contents;
   int fd = ::open(path.c_str(), O_RDONLY | O_CLOEXEC);
+  struct stat st;
+  if (fd >= 0 && ::fstat(fd, &st) != 0) {
+    int error = errno;
+    ::close(fd);
+    fd = -1;
+    errno = error;
+  }
   if (fd < 0) {
     contents.error = errno;
     if (errno != ENOENT) {
@@ -116,7 +150,9 @@ StoreContents readStore(const std::string& path) {
     }
     return contents;
   }
-  bool ok = readAll(fd, contents.bytes);
+  const FileStamp stamp = FileStamp::of(st);
+  ParsedStoreMemo::Hit hit = parsedStoreMemo().findByStamp(path, stamp);
+  bool ok = hit.dictionary || contents.read.readAll(fd);
   contents.error = errno;
   ::close(fd);
   if (!ok) {
@@ -126,10 +162,16 @@ StoreContents readStore(const std::string& path) {
         "Cannot read the printing-preferences store " + path + ": " + errorText(contents.error));
     return contents;
   }
-  contents.dictionary = parsedStoreMemo().find(path, contents.bytes);
-  if (!contents.dictionary) {
+  if (!hit.dictionary) hit = parsedStoreMemo().findByBytes(path, contents.read.view(), stamp);
+  if (hit.dictionary) {
+    contents.remembered = std::move(hit.bytes);
+    contents.bytes = *contents.remembered;
+    contents.dictionary = std::move(hit.dictionary);
+  } else {
+    contents.bytes = contents.read.view();
     contents.dictionary = cast<Dictionary>(readPropertyList(contents.bytes));
-    if (contents.dictionary) parsedStoreMemo().remember(path, contents.bytes, contents.dictionary);
+    if (contents.dictionary)
+      parsedStoreMemo().remember(path, contents.bytes, stamp, contents.dictionary);
   }
   if (!contents.dictionary) {
     contents.status = StoreContents::Status::Corrupt;

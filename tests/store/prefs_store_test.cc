@@ -55,6 +55,23 @@ TEST_F(PrefsStore, WhatIsWrittenIsReadBackAndEachCopyIsTheCallers) {
   EXPECT_TRUE(log_.lines().empty());
 }
 
+// A store read once is taken from memory while its stamp holds; a rewrite
+// in place at the same size with the times set back is still seen.
+TEST_F(PrefsStore, AStoreChangedBehindTheReadersBackIsReadAgain) {
+  const timespec old[2] = {{1'600'000'000, 0}, {1'600'000'000, 0}};
+  auto write = [&](const char* value) {
+    qrtest::writeText(store_, std::string("<plist><dict><key>k</key><string>") + value +
+                                  "</string></dict></plist>");
+    ASSERT_EQ(utimensat(AT_FDCWD, store_.c_str(), old, 0), 0);
+  };
+  fs::create_directories(fs::path(store_).parent_path());
+  for (const char* value : {"one", "two", "six"}) {
+    write(value);
+    EXPECT_TRUE(copyStringPrintingPref(*String::make("k"), 5)->equals(value));
+    EXPECT_TRUE(copyStringPrintingPref(*String::make("k"), 5)->equals(value)) << "from memory";
+  }
+}
+
 TEST_F(PrefsStore, BrokenStoresReadEmptyLogOnceAndAreKeptOrLeftAlone) {
   const std::string whole = "{old = x;}";
   // Name, what is made there (mode 0600, a directory 0700) and with what bytes, and the mode
