@@ -1,68 +1,20 @@
-// The XML property-list reader: libexpat tokenizes, and the handlers below
-// build the values on an explicit stack, so nesting costs no C++ recursion.
-// Anything outside the property-list vocabulary stops the parse with null.
+// The XML property-list reader for every form XML allows: libexpat
+// tokenizes, and the handlers below feed the value builder. Anything outside
+// the property-list vocabulary stops the parse with null. Most files are in
+// the plain form, which the plain scanner reads without expat first.
 #include <expat.h>
 
 #include <algorithm>
 #include <cstring>
-#include <iterator>
-#include <vector>
+#include <string>
 
 #include "plist/property_list.h"
-#include "plist/xml_leaf_text.h"
-#include "plist/xml_string_table.h"
-#include "values/array.h"
-#include "values/boolean.h"
-#include "values/data.h"
-#include "values/date.h"
-#include "values/dictionary.h"
-#include "values/string.h"
+#include "plist/xml_expat_reader.h"
+#include "plist/xml_plain_scanner.h"
+#include "plist/xml_value_builder.h"
 
 namespace qr {
 namespace {
-
-enum class Tag : uint8_t {
-  Unknown,
-  Plist,
-  Dict,
-  Array,
-  Key,
-  String,
-  Integer,
-  Real,
-  True,
-  False,
-  Data,
-  Date,
-};
-
-Tag tagOf(const XML_Char* name) noexcept {
-  auto is = [name](const char* word) { return std::strcmp(name + 1, word + 1) == 0; };
-  switch (name[0]) {
-    case 'k':
-      return is("key") ? Tag::Key : Tag::Unknown;
-    case 's':
-      return is("string") ? Tag::String : Tag::Unknown;
-    case 'd':
-      if (is("dict")) return Tag::Dict;
-      if (is("data")) return Tag::Data;
-      return is("date") ? Tag::Date : Tag::Unknown;
-    case 'a':
-      return is("array") ? Tag::Array : Tag::Unknown;
-    case 'i':
-      return is("integer") ? Tag::Integer : Tag::Unknown;
-    case 'r':
-      return is("real") ? Tag::Real : Tag::Unknown;
-    case 't':
-      return is("true") ? Tag::True : Tag::Unknown;
-    case 'f':
-      return is("false") ? Tag::False : Tag::Unknown;
-    case 'p':
-      return is("plist") ? Tag::Plist : Tag::Unknown;
-    default:
-      return Tag::Unknown;
-  }
-}
 
 bool isXMLSpace(const XML_Char* s, int len) noexcept {
   // Indentation reaches this handler one run at a time, millions of times
@@ -77,20 +29,11 @@ bool isXMLSpace(const XML_Char* s, int len) noexcept {
 
 class Reader {
  public:
-  explicit Reader(Mutability mutability)
-      : mutableContainers_(mutability != Mutability::Immutable),
-        mutableLeaves_(mutability == Mutability::MutableContainersAndLeaves) {}
+  explicit Reader(Mutability mutability) : builder_(mutability) {}
 
   Ref<Object> parse(std::string_view bytes);
 
  private:
-  // An open <plist>, <array> or <dict>; its children sit in values_ from
-  // `start` on (for a dictionary, key and value alternate).
-  struct Frame {
-    Tag tag;
-    size_t start;
-  };
-
   static void XMLCALL onStart(void* self, const XML_Char* name, const XML_Char** attributes);
   static void XMLCALL onEnd(void* self, const XML_Char* name);
   static void XMLCALL onText(void* self, const XML_Char* text, int length);
@@ -101,32 +44,16 @@ class Reader {
                                    const XML_Char*);
   static void XMLCALL onSkippedEntity(void* self, const XML_Char*, int);
 
-  void start(Tag tag);
-  void end();
-  bool mayStartValue(bool isKey) const noexcept;
-  Ref<Object> leafValue();
-  Ref<Object> closeArray(size_t start);
-  Ref<Object> closeDictionary(size_t start);
   void fail() noexcept {
     if (!failed_) XML_StopParser(parser_, XML_FALSE);
     failed_ = true;
   }
 
   XML_Parser parser_ = nullptr;
-  const bool mutableContainers_;
-  const bool mutableLeaves_;
   bool failed_ = false;
-  bool sawRoot_ = false;
-  Tag leaf_ = Tag::Unknown;  // the open leaf element, if any
   size_t events_ = 0;
-  std::vector<Frame> frames_;
-  std::vector<Ref<Object>> values_;
-  std::string text_;
-  Ref<Object> root_;
-  // Every key, and short immutable string values, are shared within the parse.
-  static constexpr size_t kShortString = 32;
-  static constexpr size_t kMaxShared = size_t(1) << 18;
-  xmlplist::StringTable strings_{kMaxShared};
+  xmlplist::ValueBuilder builder_;
+  std::string text_;  // of the open leaf element
 };
 
 void XMLCALL Reader::onStart(void* self, const XML_Char* name, const XML_Char**) {
@@ -134,7 +61,8 @@ void XMLCALL Reader::onStart(void* self, const XML_Char* name, const XML_Char**)
   ++r->events_;
   if (r->failed_) return;
   try {
-    r->start(tagOf(name));
+    if (!r->builder_.start(xmlplist::tagOf(name))) return r->fail();
+    r->text_.clear();
   } catch (...) {  // no exception may unwind through expat
     r->fail();
   }
@@ -146,7 +74,9 @@ void XMLCALL Reader::onEnd(void* self, const XML_Char*) {
   ++r->events_;
   if (r->failed_) return;
   try {
-    r->end();
+    bool ok = r->builder_.openLeaf() != xmlplist::Tag::Unknown ? r->builder_.endLeaf(r->text_)
+                                                               : r->builder_.endContainer();
+    if (!ok) r->fail();
   } catch (...) {
     r->fail();
   }
@@ -156,7 +86,7 @@ void XMLCALL Reader::onText(void* self, const XML_Char* text, int length) {
   auto* r = static_cast<Reader*>(self);
   ++r->events_;
   if (r->failed_) return;
-  if (r->leaf_ == Tag::Unknown) {
+  if (r->builder_.openLeaf() == xmlplist::Tag::Unknown) {
     if (!isXMLSpace(text, length)) r->fail();  // text between the elements of a container
     return;
   }
@@ -184,130 +114,6 @@ void XMLCALL Reader::onSkippedEntity(void* self, const XML_Char*, int) {
   // A reference to an entity that only an unread external DTD could define:
   // dropping it silently would change the text.
   static_cast<Reader*>(self)->fail();
-}
-
-bool Reader::mayStartValue(bool isKey) const noexcept {
-  if (leaf_ != Tag::Unknown || frames_.empty()) return false;
-  const Frame& top = frames_.back();
-  size_t children = values_.size() - top.start;
-  switch (top.tag) {
-    case Tag::Plist:
-      return !isKey && children == 0;
-    case Tag::Array:
-      return !isKey;
-    case Tag::Dict:
-      return isKey == (children % 2 == 0);
-    default:
-      return false;
-  }
-}
-
-void Reader::start(Tag tag) {
-  if (!sawRoot_) {
-    sawRoot_ = true;
-    if (tag != Tag::Plist) return fail();
-    frames_.push_back({Tag::Plist, 0});
-    return;
-  }
-  if (tag == Tag::Unknown || tag == Tag::Plist || !mayStartValue(tag == Tag::Key)) return fail();
-  // The <plist> frame holds no value of its own, so frames_.size() is the
-  // depth the new value sits at, the top level being depth one.
-  if (frames_.size() > kMaxPropertyListDepth) return fail();
-  if (tag == Tag::Array || tag == Tag::Dict) {
-    frames_.push_back({tag, values_.size()});
-    return;
-  }
-  leaf_ = tag;
-  text_.clear();
-}
-
-void Reader::end() {
-  if (leaf_ != Tag::Unknown) {
-    Ref<Object> value = leafValue();
-    leaf_ = Tag::Unknown;
-    if (!value) return fail();
-    values_.push_back(std::move(value));
-    return;
-  }
-  Frame frame = frames_.back();
-  frames_.pop_back();
-  switch (frame.tag) {
-    case Tag::Plist:
-      if (values_.size() != 1) return fail();
-      root_ = std::move(values_.back());
-      values_.clear();
-      return;
-    case Tag::Array:
-      values_.push_back(closeArray(frame.start));
-      return;
-    case Tag::Dict:
-      if ((values_.size() - frame.start) % 2 != 0) return fail();  // a key without a value
-      values_.push_back(closeDictionary(frame.start));
-      return;
-    default:
-      return fail();
-  }
-}
-
-Ref<Object> Reader::leafValue() {
-  switch (leaf_) {
-    case Tag::Key:
-      if (auto shared = strings_.intern(text_)) return shared;
-      return String::fromUTF8(text_);
-    case Tag::String:
-      if (mutableLeaves_) {
-        auto s = qr::make<MutableString>();
-        s->appendUTF8(text_);
-        return s;
-      }
-      if (text_.size() <= kShortString)
-        if (auto shared = strings_.intern(text_)) return shared;
-      return String::fromUTF8(text_);
-    case Tag::Integer:
-      return xmlplist::parseInteger(text_);
-    case Tag::Real:
-      return xmlplist::parseReal(text_);
-    case Tag::True:
-    case Tag::False:
-      if (!xmlplist::trimXMLSpace(text_).empty()) return nullptr;
-      return Boolean::of(leaf_ == Tag::True);
-    case Tag::Data: {
-      std::vector<uint8_t> bytes;
-      if (!xmlplist::decodeBase64(text_, bytes)) return nullptr;
-      if (mutableLeaves_) return qr::make<MutableData>(std::move(bytes));
-      return qr::make<qr::Data>(std::move(bytes));
-    }
-    case Tag::Date:
-      return Date::fromISO8601(xmlplist::trimXMLSpace(text_));
-    default:
-      return nullptr;
-  }
-}
-
-Ref<Object> Reader::closeArray(size_t start) {
-  std::vector<Ref<Object>> items(std::make_move_iterator(values_.begin() + ptrdiff_t(start)),
-                                 std::make_move_iterator(values_.end()));
-  values_.resize(start);
-  if (mutableContainers_) return qr::make<MutableArray>(std::move(items));
-  return qr::make<qr::Array>(std::move(items));
-}
-
-Ref<Object> Reader::closeDictionary(size_t start) {
-  size_t n = (values_.size() - start) / 2;
-  if (mutableContainers_) {
-    auto d = qr::make<MutableDictionary>();
-    d->reserve(n);
-    for (size_t i = start; i < values_.size(); i += 2)
-      d->set(std::move(values_[i]), std::move(values_[i + 1]));
-    values_.resize(start);
-    return d;
-  }
-  std::vector<std::pair<Ref<Object>, Ref<Object>>> pairs;
-  pairs.reserve(n);
-  for (size_t i = start; i < values_.size(); i += 2)
-    pairs.emplace_back(std::move(values_[i]), std::move(values_[i + 1]));
-  values_.resize(start);
-  return Dictionary::build(std::move(pairs));
 }
 
 Ref<Object> Reader::parse(std::string_view bytes) {
@@ -348,14 +154,23 @@ Ref<Object> Reader::parse(std::string_view bytes) {
   } while (offset < bytes.size());
   XML_ParserFree(parser_);
   parser_ = nullptr;
-  if (failed_ || !frames_.empty()) return nullptr;
-  return std::move(root_);
+  if (failed_) return nullptr;
+  return builder_.finish();
 }
 
 }  // namespace
 
-Ref<Object> readXMLPropertyList(std::string_view bytes, Mutability mutability) {
+Ref<Object> readXMLPropertyListWithExpat(std::string_view bytes, Mutability mutability) {
   return Reader(mutability).parse(bytes);
+}
+
+Ref<Object> readXMLPropertyList(std::string_view bytes, Mutability mutability) {
+  {
+    // Scoped, so that what a declined scan built is gone before expat starts.
+    xmlplist::PlainScan scan = xmlplist::scanPlainXMLPropertyList(bytes, mutability);
+    if (scan.outcome != xmlplist::PlainScan::Declined) return std::move(scan.value);
+  }
+  return readXMLPropertyListWithExpat(bytes, mutability);
 }
 
 }  // namespace qr

@@ -35,7 +35,16 @@ StringTable::~StringTable() {
     if (s.string) s.string->release();
 }
 
+size_t StringTable::recentIndex(std::string_view text) noexcept {
+  size_t n = text.size();
+  if (n == 0) return 0;
+  auto at = [&](size_t i) { return static_cast<unsigned char>(text[i]); };
+  return (n * 7 + at(n - 1) * 31 + at(n / 2) * 131 + at(0)) % kRecent;
+}
+
 Ref<String> StringTable::intern(std::string_view ascii) {
+  String*& recent = recent_[recentIndex(ascii)];
+  if (recent && recent->narrow() == ascii) return Ref<String>(recent);
   if (!isASCII(ascii)) return nullptr;
   if (slots_.empty()) grow();
   uint64_t h = hashText(ascii);
@@ -44,11 +53,15 @@ Ref<String> StringTable::intern(std::string_view ascii) {
   for (size_t probes = 0; probes < kMaxProbes; ++probes, i = (i + 1) & mask) {
     Slot& slot = slots_[i];
     if (!slot.string) break;
-    if (slot.hash == h && slot.string->narrow() == ascii) return Ref<String>(slot.string);
+    if (slot.hash == h && slot.string->narrow() == ascii) {
+      recent = slot.string;
+      return Ref<String>(slot.string);
+    }
   }
   Ref<String> s = String::fromUTF8(ascii);
   if (slots_[i].string || used_ >= capacity_) return s;  // not shared
   slots_[i] = {h, Ref<String>(s).leak()};
+  recent = slots_[i].string;
   if (++used_ * 2 > slots_.size()) grow();
   return s;
 }

@@ -32,8 +32,14 @@ class StringTable {
     String* string = nullptr;  // holds one reference
   };
   void grow();
+  static size_t recentIndex(std::string_view text) noexcept;
 
   std::vector<Slot> slots_;  // power-of-two size, at most half full
+  // Strings of slots_ last found or added, by a few of their bytes: a file
+  // repeats a handful of keys, which this finds without hashing them or
+  // reaching into the large table.
+  static constexpr size_t kRecent = 64;
+  String* recent_[kRecent] = {};
   size_t used_ = 0;
   size_t capacity_;
 };

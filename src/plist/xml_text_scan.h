@@ -25,8 +25,9 @@ struct AsciiClassTable {
 inline constexpr AsciiClassTable kAsciiClass;
 
 namespace detail {
+// Bytes from 0x80 up too, as the signed compare below finds them.
 inline bool needsLook(unsigned char c) noexcept {
-  return c < 0x20 || c == '&' || c == '<' || c == '>';
+  return c < 0x20 || c >= 0x80 || c == '&' || c == '<' || c == '>';
 }
 #ifdef __SSE2__
 // Bit i set where byte i of the 16 at s needs a look.

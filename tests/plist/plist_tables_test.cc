@@ -5,6 +5,8 @@
 #include <malloc.h>
 
 #include "plist/property_list.h"
+#include "plist/xml_expat_reader.h"
+#include "plist/xml_plain_scanner.h"
 #include "support/plist_identity.h"
 #include "values/url.h"
 #include "values/uuid.h"
@@ -68,6 +70,46 @@ TEST(XMLPropertyList, WritesOneCanonicalForm) {
       "\t\t<string>Tom &amp; Jerry &lt;&#13;&gt;</string>\n\t\t<array/>\n\t\t<dict/>\n"
       "\t\t<date>2000-12-31T23:59:58Z</date>\n\t\t<real>0.5</real>\n\t</array>\n"
       "\t<key>\xEF\xBD\x9E</key>\n\t<false/>\n</dict>\n</plist>\n");
+}
+
+TEST(XMLPropertyList, PlainScannerReadsWhatExpatReadsOrDeclines) {
+  using xmlplist::PlainScan;
+  constexpr auto Read = PlainScan::Read, Bad = PlainScan::Malformed, No = PlainScan::Declined;
+  const std::string head = "\xEF\xBB\xBF<?xml version='1.0' encoding='utf-8' standalone='no'?>\r\n"
+                           "<!DOCTYPE plist PUBLIC \"-//A//DTD PLIST 1.0//EN\" \"http://a/p.dtd\">";
+  const std::pair<std::string, PlainScan::Outcome> rows[] = {
+      // clang-format off
+      {head + "<plist version=\"1.0\"><dict/></plist>\n", Read},
+      {P("<string> a\tb\r\nc\rd &amp;&lt;&gt;&quot;&apos;&#65;&#x1F5A8;&#13;\n</string>"), Read},
+      {P("<array><array/><dict></dict><string/><data>\r\nAAEC\r\n</data></array>"), Read},
+      {P("<dict ><key >k</key\n><true ></true ></dict >"), Read},
+      {P("<string>\x7F\xC2\x85\xEF\xBF\xBD\xF4\x8F\xBF\xBF]]</string>"), Read},
+      {P(repeat("<array>", 512) + repeat("</array>", 512)), Read},
+      {P(repeat("<array>", 513) + repeat("</array>", 513)), Bad},
+      {P("<array><key>k</key></array>"), Bad}, {P("<dict><key>k</key></dict>"), Bad},
+      {P("<array></dict>"), Bad}, {P("<array>x</array>"), Bad}, {P("<unknown/>"), Bad},
+      {P("<integer>1x</integer>"), Bad}, {"<plist/>", Bad}, {P("<string>a<b/></string>"), Bad},
+      {P("<true/>") + "<!-- after -->", No}, {P("<string><![CDATA[x]]></string>"), No},
+      {P("<array><!-- c --></array>"), No}, {"<!DOCTYPE plist [ ]>" + P("<true/>"), No},
+      {"<?xml version=\"1.0\" encoding=\"ISO-8859-1\"?>" + P("<string>\xE9</string>"), No},
+      {"\xFF\xFE<\0p\0"s, No}, {"<?xml version=\"1.0\"?><?pi x?>" + P("<true/>"), No},
+      {"<plist xmlns=\"x\"><true/></plist>", No}, {P("<string a=\"b\">x</string>"), No},
+      {P("<array>&#32;</array>"), No}, {P("<string>&e;</string>"), No},
+      {P("<string>]]></string>"), No}, {P("<string>\xFF</string>"), No},
+      {P("<string>\xEF\xBF\xBE</string>"), No}, {P("<string>\xED\xA0\x80</string>"), No},
+      {P("<string>&#0;</string>"), No}, {P("<string>&#xD800;</string>"), No},
+      {P("<string>\x01</string>"), No}, {"<plist><string>\xFF</string>", No}};
+  // clang-format on
+  for (const auto& [doc, outcome] : rows) {
+    for (auto m : kAllMutabilities) {
+      PlainScan scan = xmlplist::scanPlainXMLPropertyList(doc, m);
+      Ref<Object> expat = readXMLPropertyListWithExpat(doc, m);
+      EXPECT_EQ(scan.outcome, outcome) << doc;
+      if (outcome == No) continue;
+      EXPECT_EQ(bool(expat), outcome == Read) << doc;
+      EXPECT_TRUE(identical(scan.value.get(), expat.get(), &m)) << doc;
+    }
+  }
 }
 
 TEST(PropertyList, ReadsWhatOtherWritersWrite) {
