@@ -114,17 +114,21 @@ TEST(XMLPropertyList, PlainScannerReadsWhatExpatReadsOrDeclines) {
 
 TEST(PropertyList, ReadsWhatOtherWritersWrite) {
   auto* W = &String::fromUTF16;
-  const std::string table = "/* c */ \"Print\" = \"Drucken\"; // the value is the key\n'OK';\n"
+  const std::string table =
+      "/* c */ \"Print\" = \"Drucken\"; // the value is the key\n'OK';\n"
       "Size = \"Gr\xC3\xB6\xC3\x9F\\\"\"; \"\xF0\x9F\x96\xA8\" = 1; \"\xF0\x9F\x96\xA8\" = 2;";
-  auto strings = D({{"Print", S("Drucken")}, {"OK", S("OK")}, {"Size", S("Gr\xC3\xB6\xC3\x9F\"")},
+  auto strings = D({{"Print", S("Drucken")},
+                    {"OK", S("OK")},
+                    {"Size", S("Gr\xC3\xB6\xC3\x9F\"")},
                     {"\xF0\x9F\x96\xA8", S("2")}});
   const std::pair<std::string, Ref<Object>> rows[] = {
       {"<?xml version=\"1.0\"?><!DOCTYPE plist SYSTEM \"plist.dtd\"><!--c-->" + P("<true> </true>"),
-       Boolean::trueValue()}, {utf16("\n" + P("<string>\xF0\x9F\x96\xA8</string>"), 0),
-       S("\xF0\x9F\x96\xA8")},
+       Boolean::trueValue()},
+      {utf16("\n" + P("<string>\xF0\x9F\x96\xA8</string>"), 0), S("\xF0\x9F\x96\xA8")},
       {P("<integer>0xAaBbCcDdEeFf</integer>"), I(0xAABBCCDDEEFF)},
       {P("<real>+inf</real>"), R(HUGE_VAL)},
-      {P("<integer>0X0123456789</integer>"), I(0x123456789)}, {P("<integer> +7 </integer>"), I(7)},
+      {P("<integer>0X0123456789</integer>"), I(0x123456789)},
+      {P("<integer> +7 </integer>"), I(7)},
       {P("<real>-1e999</real>"), R(-HUGE_VAL)},
       {P("<data> AAEC\n Aw== </data>"), B("\0\1\2\3"sv)},
       {P("<string><![CDATA[<raw> & ]]>x&#x1F5A8;&#13;</string>"), S("<raw> & x\xF0\x9F\x96\xA8\r")},
@@ -133,7 +137,8 @@ TEST(PropertyList, ReadsWhatOtherWritersWrite) {
       {P("<dict><key>k</key><true/><key>k</key><string>z</string></dict>"), D({{"k", S("z")}})},
       // binary forms plistlib never writes: 4-byte reals, 16-byte integers, lone surrogates,
       // 2-byte references, and a key repeated in another encoding
-      {bplist({"\x22\x3F\xC0\0\0"s}), R(1.5)}, {bplist({"\x14" + be(0, 8) + be(5, 8)}), I(5)},
+      {bplist({"\x22\x3F\xC0\0\0"s}), R(1.5)},
+      {bplist({"\x14" + be(0, 8) + be(5, 8)}), I(5)},
       {bplist({"\x14" + be(UINT64_MAX, 8) + be(1ull << 63, 8)}), I(INT64_MIN)},
       {bplist({"\x62\xD8\0\0x"s}), W(u"\xD800x")},
       {bplist({refs(0xA, {1, 1}, 2), "\x10\0"s}, 2), A({I(0), I(0)})},
@@ -142,8 +147,12 @@ TEST(PropertyList, ReadsWhatOtherWritersWrite) {
       // text: escapes (at most three octal and four hex digits), strings tables in every encoding
       {R"("\" \\ \n\t\r\a\b\f\v \' \x \101\0 \377 \1234 \U00e9\UD83D\UDE00 \U12345 \UdEaD")",
        W(u"\" \\ \n\t\r\a\b\f\v ' x A\0 \u00ff S4 \u00e9\U0001F600 \u12345 \xDEAD"sv)},
-      {table, strings}, {"\xEF\xBB\xBF" + table, strings}, {utf16(table, 1), strings},
-      {utf16(table, 0), strings}, {"\xEF\xBB\xBF //\n", D({})}, {utf16("<0a0B>", 1), B("\n\v")}};
+      {table, strings},
+      {"\xEF\xBB\xBF" + table, strings},
+      {utf16(table, 1), strings},
+      {utf16(table, 0), strings},
+      {"\xEF\xBB\xBF //\n", D({})},
+      {utf16("<0a0B>", 1), B("\n\v")}};
   // clang-format on
   for (const auto& [doc, want] : rows)
     for (auto m : kAllMutabilities)
