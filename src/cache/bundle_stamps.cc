@@ -12,19 +12,6 @@ constexpr std::string_view kStampsPrefKey = "cachewright bundle stamps";
 constexpr int kPrefDomain = 8;
 constexpr std::string_view kInfoKey = "Info";
 
-int64_t nanoseconds(const timespec& t) { return int64_t(t.tv_sec) * 1'000'000'000 + t.tv_nsec; }
-
-timespec fromNanoseconds(int64_t ns) {
-  timespec t{};
-  t.tv_sec = ns / 1'000'000'000;
-  t.tv_nsec = ns % 1'000'000'000;
-  if (t.tv_nsec < 0) {
-    t.tv_nsec += 1'000'000'000;
-    --t.tv_sec;
-  }
-  return t;
-}
-
 Ref<Dictionary> describe(const FileStamp& stamp, Dictionary& info) {
   auto entry = make<MutableDictionary>();
   entry->set("Device", Number::unsignedInteger(uint64_t(stamp.device)));

@@ -2,6 +2,7 @@
 
 #include <sys/stat.h>
 
+#include "platform/file_stamp.h"
 #include "store/prefs_store.h"
 #include "values/number.h"
 #include "values/string.h"
@@ -37,8 +38,7 @@ Ref<Dictionary> FailureMemory::describe(const PlugIn& plugin) {
   struct stat st;
   auto executable = plugin.bundle().executablePath();
   if (executable && ::stat(executable->c_str(), &st) == 0) {
-    int64_t nanoseconds = int64_t(st.st_mtim.tv_sec) * 1000000000 + st.st_mtim.tv_nsec;
-    identity->set("Executable Modified", Number::integer(nanoseconds));
+    identity->set("Executable Modified", Number::integer(nanoseconds(st.st_mtim)));
     identity->set("Executable Size", Number::integer(int64_t(st.st_size)));
   }
   return identity;

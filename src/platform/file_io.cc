@@ -9,22 +9,10 @@
 namespace qr {
 
 bool readAll(int fd, std::string& out) {
-  // Straight into the string, sized from fstat() when that can tell: a large
-  // store is read several times a run.
-  struct stat st;
-  size_t expected = ::fstat(fd, &st) == 0 && S_ISREG(st.st_mode) && st.st_size > 0
-                        ? static_cast<size_t>(st.st_size)
-                        : 0;
-  out.reserve(out.size() + expected + 1);  // + 1: room for the read that finds the end
-  for (;;) {
-    size_t used = out.size();
-    if (out.capacity() - used < (expected ? 1 : 4096)) out.reserve(2 * out.capacity() + 32768);
-    out.resize(out.capacity());
-    ssize_t n = ::read(fd, out.data() + used, out.size() - used);
-    out.resize(used + (n > 0 ? static_cast<size_t>(n) : 0));
-    if (n == 0) return true;
-    if (n < 0 && errno != EINTR) return false;
-  }
+  InputBuffer input;
+  bool ok = input.readAll(fd);
+  out.append(input.view());
+  return ok;
 }
 
 bool InputBuffer::readAll(int fd) {

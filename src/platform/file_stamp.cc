@@ -11,10 +11,6 @@ namespace {
 // Wider than the coarsest file-system timestamps (FAT keeps two seconds).
 constexpr int64_t kRacyWindowNs = 3'000'000'000;
 
-int64_t nanoseconds(const timespec& t) noexcept {
-  return int64_t(t.tv_sec) * 1'000'000'000 + t.tv_nsec;
-}
-
 // Reads to the end of file; none on an error or when the file grew past maxSize
 // while being read.
 std::optional<std::string> readAtMost(int fd, size_t expected, size_t maxSize) {
@@ -32,6 +28,21 @@ std::optional<std::string> readAtMost(int fd, size_t expected, size_t maxSize) {
 }
 
 }  // namespace
+
+int64_t nanoseconds(const timespec& t) noexcept {
+  return int64_t(t.tv_sec) * 1'000'000'000 + t.tv_nsec;
+}
+
+timespec fromNanoseconds(int64_t ns) noexcept {
+  timespec t{};
+  t.tv_sec = ns / 1'000'000'000;
+  t.tv_nsec = ns % 1'000'000'000;
+  if (t.tv_nsec < 0) {
+    t.tv_nsec += 1'000'000'000;
+    --t.tv_sec;
+  }
+  return t;
+}
 
 FileStamp FileStamp::of(const struct stat& st) noexcept {
   FileStamp s;

@@ -14,6 +14,10 @@
 
 namespace qr {
 
+// Times as one count of nanoseconds since the epoch, and back.
+int64_t nanoseconds(const timespec& t) noexcept;
+timespec fromNanoseconds(int64_t ns) noexcept;
+
 struct FileStamp {
   dev_t device = 0;
   ino_t inode = 0;

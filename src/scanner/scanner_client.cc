@@ -127,6 +127,16 @@ void ScannerClient::start() {
   current_.generation = ++generation_;
 }
 
+ScannerClient::Helper& ScannerClient::helperForNewInterface() {
+  if (current_.process && current_.loads >= loadsPerHelper_) {
+    earlier_.push_back(std::move(current_));
+    current_ = {};
+  }
+  if (!current_.process) start();
+  ++current_.loads;
+  return current_;
+}
+
 void ScannerClient::lose(Helper& helper, const std::string& what) {
   size_t entry = helper.entryPage->bytes()[0];
   helper.process.reset();
@@ -197,13 +207,7 @@ InterfaceLoad ScannerClient::loadInterface(PlugIn& plugin, const UUID& factoryID
     message->set(kThen, question);
   }
   followUp_ = {};
-  if (current_.process && current_.loads >= loadsPerHelper_) {
-    earlier_.push_back(std::move(current_));
-    current_ = {};
-  }
-  if (!current_.process) start();
-  ++current_.loads;
-  Ref<Dictionary> reply = call(current_, kLoad, *message);
+  Ref<Dictionary> reply = call(helperForNewInterface(), kLoad, *message);
   InterfaceLoad load;
   load.instanceMade = reply->get(kMade) != nullptr;
   load.queryResult = static_cast<int32_t>(integerValue(*reply, kStatus));
@@ -240,9 +244,8 @@ std::pair<ScannerClient::Helper*, int64_t> ScannerClient::liveAddress(PluginHand
     if (helper.process && helper.generation == remote.generation) return {&helper, remote.address};
   // Another module took its helper down: make this one's interface again in
   // the current helper, the way it was made the first time.
-  if (!current_.process) start();
-  ++current_.loads;
-  remote.address = integerValue(*call(current_, kLoad, *remote.loadRequest), kHandle);
+  remote.address =
+      integerValue(*call(helperForNewInterface(), kLoad, *remote.loadRequest), kHandle);
   remote.generation = current_.generation;
   return {&current_, remote.address};
 }

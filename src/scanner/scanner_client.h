@@ -56,6 +56,9 @@ class ScannerClient final : public PluginRunner {
   Ref<Dictionary> takeFollowUp(PluginHandle handle, std::string_view entry,
                                const String* connectionType);
   void start();
+  // The helper that makes the next interface: the current one, or a fresh
+  // one once the current has made its share.
+  Helper& helperForNewInterface();
   Ref<Dictionary> call(Helper& helper, std::string_view entry, const Dictionary& request);
   [[noreturn]] void lose(Helper& helper, const std::string& what);
   // The helper holding a handle's interface and its address there; an

@@ -13,7 +13,6 @@
 #include <cerrno>
 #include <cstdlib>
 #include <cstring>
-#include <memory>
 #include <mutex>
 #include <set>
 
@@ -77,27 +76,23 @@ bool makeDirectories(const std::string& dir) {
 // otherwise a read that finds the same bytes takes the dictionary parsed before.
 class ParsedStoreMemo {
  public:
-  struct Hit {
-    Ref<Dictionary> dictionary;  // immutable, so it can be handed to every reader
-    std::shared_ptr<const std::string> bytes;
-  };
-  Hit findByStamp(const std::string& path, const FileStamp& stamp) {
+  Ref<Dictionary> findByStamp(const std::string& path, const FileStamp& stamp) {
     std::lock_guard<std::mutex> lock(mutex_);
-    if (path != path_ || !stampProves_ || !(stamp == stamp_)) return {};
-    return {dictionary_, bytes_};
+    if (path != path_ || !stampProves_ || !(stamp == stamp_)) return nullptr;
+    return dictionary_;
   }
-  Hit findByBytes(const std::string& path, std::string_view bytes, const FileStamp& stamp) {
+  Ref<Dictionary> findByBytes(const std::string& path, std::string_view bytes,
+                              const FileStamp& stamp) {
     std::lock_guard<std::mutex> lock(mutex_);
-    if (path != path_ || !bytes_ || bytes != *bytes_) return {};
+    if (path != path_ || bytes != bytes_) return nullptr;
     restamp(stamp);
-    return {dictionary_, bytes_};
+    return dictionary_;
   }
   void remember(const std::string& path, std::string_view bytes, const FileStamp& stamp,
                 Ref<Dictionary> dictionary) {
-    auto kept = std::make_shared<const std::string>(bytes);
     std::lock_guard<std::mutex> lock(mutex_);
     path_ = path;
-    bytes_ = std::move(kept);
+    bytes_ = bytes;
     dictionary_ = std::move(dictionary);
     restamp(stamp);
   }
@@ -110,10 +105,10 @@ class ParsedStoreMemo {
 
   std::mutex mutex_;
   std::string path_;
-  std::shared_ptr<const std::string> bytes_;
+  std::string bytes_;
   FileStamp stamp_;
   bool stampProves_ = false;
-  Ref<Dictionary> dictionary_;
+  Ref<Dictionary> dictionary_;  // immutable, so it can be handed to every reader
 };
 
 ParsedStoreMemo& parsedStoreMemo() {
@@ -124,9 +119,7 @@ ParsedStoreMemo& parsedStoreMemo() {
 struct StoreContents {
   enum class Status { Missing, Parsed, Corrupt, Unreadable } status = Status::Missing;
   int error = 0;
-  std::string_view bytes;  // in read or in remembered
-  InputBuffer read;
-  std::shared_ptr<const std::string> remembered;
+  InputBuffer bytes;           // none read when the memo's stamp held
   Ref<Dictionary> dictionary;  // immutable
 };
 
@@ -151,8 +144,8 @@ StoreContents readStore(const std::string& path) {
     return contents;
   }
   const FileStamp stamp = FileStamp::of(st);
-  ParsedStoreMemo::Hit hit = parsedStoreMemo().findByStamp(path, stamp);
-  bool ok = hit.dictionary || contents.read.readAll(fd);
+  contents.dictionary = parsedStoreMemo().findByStamp(path, stamp);
+  bool ok = contents.dictionary || contents.bytes.readAll(fd);
   contents.error = errno;
   ::close(fd);
   if (!ok) {
@@ -162,16 +155,11 @@ StoreContents readStore(const std::string& path) {
         "Cannot read the printing-preferences store " + path + ": " + errorText(contents.error));
     return contents;
   }
-  if (!hit.dictionary) hit = parsedStoreMemo().findByBytes(path, contents.read.view(), stamp);
-  if (hit.dictionary) {
-    contents.remembered = std::move(hit.bytes);
-    contents.bytes = *contents.remembered;
-    contents.dictionary = std::move(hit.dictionary);
-  } else {
-    contents.bytes = contents.read.view();
-    contents.dictionary = cast<Dictionary>(readPropertyList(contents.bytes));
-    if (contents.dictionary)
-      parsedStoreMemo().remember(path, contents.bytes, stamp, contents.dictionary);
+  std::string_view bytes = contents.bytes.view();
+  if (!contents.dictionary) contents.dictionary = parsedStoreMemo().findByBytes(path, bytes, stamp);
+  if (!contents.dictionary) {
+    contents.dictionary = cast<Dictionary>(readPropertyList(bytes));
+    if (contents.dictionary) parsedStoreMemo().remember(path, bytes, stamp, contents.dictionary);
   }
   if (!contents.dictionary) {
     contents.status = StoreContents::Status::Corrupt;
@@ -345,7 +333,7 @@ bool setPrintingPref(const String& key, const Object& value, int /*domain*/) {
       return false;
     case StoreContents::Status::Corrupt: {
       std::string kept = store + ".corrupt";
-      if (!replaceFile(kept, current.bytes, kStoreMode)) return false;
+      if (!replaceFile(kept, current.bytes.view(), kStoreMode)) return false;
       log("The unreadable printing-preferences store %s is kept as %s", store, kept);
       dictionary = make<MutableDictionary>();
       break;
@@ -363,9 +351,6 @@ bool setPrintingPref(const String& key, const Object& value, int /*domain*/) {
     log("Printing preference %@ not stored: cannot write %s as a property list", &key, store);
     return false;
   }
-  // A store that already holds exactly these bytes is left as it is: a
-  // rewrite would change nothing but cost a sync of the whole file.
-  if (current.status == StoreContents::Status::Parsed && *xml == current.bytes) return true;
   return replaceFile(store, *xml, existingModeOr(store, kStoreMode));
 }
 

@@ -33,7 +33,8 @@ constexpr int kMaxDiscoveryDepth = 200;
 // Path mode: exactly one word after the program name, and it begins with "/".
 bool isPathMode(int argc, char** argv) { return argc == 2 && argv[1][0] == '/'; }
 
-void addURLs(const QuarrinHost& host, std::set<std::string>& urls) {
+// Notes the host's modules as installed, and keeps their bundles' stamps.
+void noteInstalled(const QuarrinHost& host, std::set<std::string>& urls) {
   for (const auto& key : host.loadedPlugins()->keys()) {
     if (auto* url = cast<URL>(key.get())) {
       urls.insert(url->absoluteString());
@@ -61,7 +62,7 @@ std::set<std::string> askModules() {
   for (const QuarrinHost* host :
        {static_cast<QuarrinHost*>(pmHost.get()), static_cast<QuarrinHost*>(iomHost.get()),
         static_cast<QuarrinHost*>(pbmHost.get())})
-    addURLs(*host, installed);
+    noteInstalled(*host, installed);
   return installed;
 }
 
