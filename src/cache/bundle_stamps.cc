@@ -64,7 +64,15 @@ void BundleStamps::keep(const URL& module) {
   Ref<Bundle> bundle = path ? Bundle::open(*path) : nullptr;
   std::optional<FileStamp> stamp = bundle ? bundle->provenInfoStamp() : std::nullopt;
   if (!stamp) return;
-  kept_->set(String::make(bundle->path()), describe(*stamp, *bundle->infoDictionary()));
+  Dictionary* info = bundle->infoDictionary();
+  // A bundle that took its Info dictionary from the stored record, under the
+  // same stamp, keeps that record as it is.
+  auto* record = stored_ ? stored_->getAs<Dictionary>(bundle->path()) : nullptr;
+  if (record && record->get(kInfoKey) == info && stampOf(*record) == *stamp) {
+    kept_->set(String::make(bundle->path()), Ref<Dictionary>(record));
+    return;
+  }
+  kept_->set(String::make(bundle->path()), describe(*stamp, *info));
 }
 
 bool BundleStamps::save() {

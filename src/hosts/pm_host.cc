@@ -3,6 +3,14 @@
 #include "values/deep_copy.h"
 
 namespace qr {
+namespace {
+
+const Ref<Object>& connectionTypeKey() {
+  static const Ref<Object> key(immortal(String::make("connectionType").leak()));
+  return key;
+}
+
+}  // namespace
 
 PMModule* PMHost::pmInterfaceForURL(const URL* url) const {
   if (!url) return nullptr;
@@ -33,11 +41,18 @@ LookupInfoList* PMHost::GetLookupInfoList(const String& connectionType) {
     if (!module) continue;
     Ref<MutableArray> answer = module->createBrowserInfoForConnectionType(connectionType);
     if (!answer) continue;
+    // An answer made afresh for this call (the cache's are) is already the
+    // copy the list needs, and is taken as it is.
+    bool soleAnswer = answer->retainCount() == 1;
     for (const auto& entry : *answer) {
-      auto copy = cast<MutableDictionary>(deepCopy(*entry, Mutability::MutableContainersAndLeaves));
+      Ref<MutableDictionary> copy;
+      if (soleAnswer && isSoleMutableTree(*entry))
+        copy = cast<MutableDictionary>(entry.get());
+      else
+        copy = cast<MutableDictionary>(deepCopy(*entry, Mutability::MutableContainersAndLeaves));
       if (!copy) continue;  // not a property-list dictionary
-      copy->set("connectionType", type);
-      list->addItem(make<LookupInfoItem>(url, copy.get()));
+      copy->set(connectionTypeKey(), type);
+      list->addItem(make<LookupInfoItem>(url, std::move(copy)));
     }
   }
   return list;

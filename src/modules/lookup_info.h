@@ -17,6 +17,9 @@ namespace qr {
 class LookupInfoItem final : public LookupReference {
  public:
   LookupInfoItem(const URL* pm, const Dictionary* lookupInfo);  // initWithPM:lookupInfo:
+  // Takes lookupInfo itself as the item's own dictionary; the caller gives it
+  // up and must hold no other reference to it.
+  LookupInfoItem(const URL* pm, Ref<MutableDictionary> lookupInfo);
   ~LookupInfoItem() override;
 
   const Ref<URL>& pmURL() const noexcept { return pmURL_; }
@@ -33,6 +36,8 @@ class LookupInfoItem final : public LookupReference {
   Dictionary* referencedLookupInfo() const override { return lookupInfo_.get(); }
 
  private:
+  // Makes info the item's own dictionary, with the uncounted back-reference.
+  void adopt(Ref<MutableDictionary> info);
   // Takes the uncounted back-reference out of the item's own dictionary.
   void detach();
 

@@ -98,7 +98,43 @@ Ref<Object> copy(const Object& v, Mutability m, size_t depth) {
   }
 }
 
+// Numbers, booleans and dates are shared by every copy, so only the nodes a
+// copy would make afresh must be unshared.
+bool soleMutable(const Object& v, size_t depth) {
+  if (depth > kMaxPropertyListDepth) return false;
+  switch (v.kind()) {
+    case TypeKind::Number:
+    case TypeKind::Boolean:
+    case TypeKind::Date:
+      return true;
+    case TypeKind::String:
+      return v.retainCount() == 1 && dynamic_cast<const MutableString*>(&v);
+    case TypeKind::Data:
+      return v.retainCount() == 1 && dynamic_cast<const MutableData*>(&v);
+    case TypeKind::Array: {
+      if (v.retainCount() != 1 || !dynamic_cast<const MutableArray*>(&v)) return false;
+      for (const auto& item : static_cast<const Array&>(v))
+        if (!soleMutable(*item, depth + 1)) return false;
+      return true;
+    }
+    case TypeKind::Dictionary: {
+      if (v.retainCount() != 1 || !dynamic_cast<const MutableDictionary*>(&v)) return false;
+      bool ok = true;
+      // A copy's keys are immutable strings.
+      static_cast<const Dictionary&>(v).forEach([&](const Object& k, const Object& value) {
+        ok = ok && k.kind() == TypeKind::String && !dynamic_cast<const MutableString*>(&k) &&
+             soleMutable(value, depth + 1);
+      });
+      return ok;
+    }
+    default:
+      return false;
+  }
+}
+
 }  // namespace
+
+bool isSoleMutableTree(const Object& value) { return soleMutable(value, 1); }
 
 bool isPropertyList(const Object& value) { return check(value, 1); }
 

@@ -20,4 +20,9 @@ bool isPropertyList(const Object& value);
 // that is not a property-list value, or nests too deep.
 Ref<Object> deepCopy(const Object& value, Mutability mutability);
 
+// True when value is already what a MutableContainersAndLeaves copy of it would
+// be, and each of its containers and mutable leaves has one reference only: the
+// holder of that one reference may then take the tree as its own copy.
+bool isSoleMutableTree(const Object& value);
+
 }  // namespace qr

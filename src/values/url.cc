@@ -171,7 +171,11 @@ Ref<URL> URL::fileURL(std::string_view path, bool isDirectory, const Ref<URL>& b
   return Ref<URL>::adopt(new URL(escaped, base));
 }
 
-Ref<URL> URL::absoluteURL() const { return Ref<URL>::adopt(new URL(absolute_, nullptr)); }
+Ref<URL> URL::absoluteURL() const {
+  // URLs never change, so one that already is its absolute form stands for it.
+  if (!base_ && relative_ == absolute_) return Ref<URL>(const_cast<URL*>(this));
+  return Ref<URL>::adopt(new URL(absolute_, nullptr));
+}
 
 bool URL::hasDirectoryPath() const noexcept {
   std::string_view prefix, path;

@@ -25,7 +25,7 @@ class URL final : public Object {
   const std::string& relativeString() const noexcept { return relative_; }
   const Ref<URL>& baseURL() const noexcept { return base_; }
   const std::string& absoluteString() const noexcept { return absolute_; }
-  // A URL made afresh from the absolute string, with no base.
+  // The URL of the absolute string, with no base (this one when it is that already).
   Ref<URL> absoluteURL() const;
   bool hasDirectoryPath() const noexcept;
   bool isFileURL() const noexcept;

@@ -3,6 +3,8 @@
 // no property lists.
 #include <gtest/gtest.h>
 
+#include <functional>
+
 #include "support/plist_identity.h"
 #include "values/url.h"
 #include "values/uuid.h"
@@ -117,5 +119,36 @@ TEST(URL, FileURLsEscapeResolveAndDecode) {
     EXPECT_EQ(r.url ? r.url->absoluteString() : "", r.absolute ? r.absolute : "");
     auto path = r.url ? r.url->fileSystemPath() : std::nullopt;
     EXPECT_EQ(path.value_or(""), r.path ? r.path : "") << (r.absolute ? r.absolute : "");
+  }
+}
+
+TEST(DeepCopy, ATreeServesAsItsOwnCopyOnlyWhenNothingElseHoldsAnyOfIt) {
+  const Mutability all = Mutability::MutableContainersAndLeaves;
+  Ref<Object> held;  // a part kept alive elsewhere
+  using Edit = std::function<void(MutableDictionary&)>;
+  const std::pair<Edit, bool> rows[] = {
+      {[](MutableDictionary&) {}, true},
+      {[&](MutableDictionary& d) { held = d.get("a"); }, false},  // a leaf held elsewhere
+      {[&](MutableDictionary& d) { held = d.get("b"); }, false},  // a container held elsewhere
+      // Numbers are shared by every copy anyway.
+      {[&](MutableDictionary& d) { held = cast<Array>(d.get("b"))->at(0); }, true},
+      {[](MutableDictionary& d) { d.set("a", S("frozen")); }, false},
+      {[](MutableDictionary& d) { d.set("c", D({})); }, false},
+      {[](MutableDictionary& d) {
+         d.set(String::make("k")->mutableCopy(), String::make("v")->mutableCopy());
+       },
+       false},
+      {[](MutableDictionary& d) { d.set("e", Ref<Object>(d.get("c"))); }, false},  // one node twice
+      {[](MutableDictionary& d) { d.set("u", URL::fileURL("/x", false)); }, false},
+  };
+  for (size_t i = 0; i < std::size(rows); ++i) {
+    held.reset();
+    auto tree = cast<MutableDictionary>(
+        deepCopy(*D({{"a", S("x")}, {"b", A({I(1), B("d")})}, {"c", D({{"k", S("v")}})}}), all));
+    rows[i].first(*tree);
+    EXPECT_EQ(isSoleMutableTree(*tree), rows[i].second) << "row " << i;
+    if (rows[i].second) {
+      EXPECT_TRUE(identical(tree.get(), deepCopy(*tree, all).get(), &all)) << i;
+    }
   }
 }
