@@ -16,7 +16,7 @@ inline Object* fromC(QrTypeRef handle) noexcept {
 // The object behind a handle as T, or null for NULL or another kind.
 template <class T>
 T* fromCAs(QrTypeRef handle) noexcept {
-  return handle ? dynamic_cast<T*>(fromC(handle)) : nullptr;
+  return handle ? cast<T>(fromC(handle)) : nullptr;
 }
 
 // Lends an object to C code: no reference changes hands.

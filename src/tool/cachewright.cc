@@ -6,6 +6,7 @@
 #include <memory>
 #include <set>
 #include <string>
+#include <vector>
 
 #include "bundles/bundle.h"
 #include "cache/bundle_stamps.h"
@@ -44,10 +45,11 @@ void noteInstalled(const QuarrinHost& host, std::set<std::string>& urls) {
 }
 
 // Finds the installed modules and asks each what it offers; the answers land
-// in the cache. The hosts, and with them every module, go when this returns.
-// Gives the URLs of the modules found. Each bundle is looked at once: its
-// version cannot change between the questions of one run.
-std::set<std::string> askModules() {
+// in the cache, and the lookup lists built from them in lists. The hosts, and
+// with them every module, go when this returns. Gives the URLs of the modules
+// found. Each bundle is looked at once: its version cannot change between the
+// questions of one run.
+std::set<std::string> askModules(std::vector<Ref<LookupInfoList>>& lists) {
   BundleRunScope oncePerRun;
   auto pmHost = make<PMHost>();
   auto iomHost = make<IOMHost>();
@@ -56,7 +58,8 @@ std::set<std::string> askModules() {
   discoverModules(kMaxDiscoveryDepth, *pmHost, *iomHost, *pbmHost);
   for (const auto& item : *iomHost->connectionInfoList()) {
     auto* record = cast<ConnectionInfo>(item.get());
-    if (record && record->connectionType()) pmHost->GetLookupInfoList(*record->connectionType());
+    if (record && record->connectionType())
+      lists.emplace_back(pmHost->GetLookupInfoList(*record->connectionType()));
   }
   std::set<std::string> installed;
   for (const QuarrinHost* host :
@@ -75,7 +78,7 @@ bool writeCacheFile(const char* path) {
 
 }  // namespace
 
-int runCachewright(int argc, char** argv, bool isolatePlugins) {
+int runCachewright(int argc, char** argv, bool isolatePlugins, bool processEnds) {
   bool streamMode = false;
   for (int opt; (opt = getopt(argc, argv, "s?")) != -1;) {
     if (opt != 's') {
@@ -95,8 +98,15 @@ int runCachewright(int argc, char** argv, bool isolatePlugins) {
   if (isolatePlugins) PluginRunner::install(std::make_unique<ScannerClient>(scannerProgramPath()));
   if (isPathMode(argc, argv)) FailureMemory::shared().setConsulted(false);
   BundleStamps::shared().consult();
-  std::set<std::string> installed = askModules();
+  std::vector<Ref<LookupInfoList>> lists;
+  std::set<std::string> installed = askModules(lists);
   PluginRunner::install(nullptr);
+  // The lists hold a copy of every answer and no module: a process about to
+  // end leaves them to the exit instead of freeing them one by one.
+  if (processEnds) {
+    static auto* const leftToExit = new std::vector<Ref<LookupInfoList>>;
+    leftToExit->swap(lists);
+  }
   FailureMemory::shared().keepOnly(installed);
   FailureMemory::shared().save();
   // Stream mode leaves the store to the failure record alone.

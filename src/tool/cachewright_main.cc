@@ -1,3 +1,3 @@
 #include "tool/cachewright.h"
 
-int main(int argc, char** argv) { return qr::runCachewright(argc, argv); }
+int main(int argc, char** argv) { return qr::runCachewright(argc, argv, true, true); }

@@ -48,4 +48,7 @@ class MutableArray final : public Array {
   void reserve(size_t n) { items_.reserve(n); }
 };
 
+template <>
+inline constexpr TypeKind kExactKind<Array> = TypeKind::Array;
+
 }  // namespace qr

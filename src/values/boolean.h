@@ -23,4 +23,7 @@ class Boolean final : public Object {
   bool value_;
 };
 
+template <>
+inline constexpr TypeKind kExactKind<Boolean> = TypeKind::Boolean;
+
 }  // namespace qr

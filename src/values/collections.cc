@@ -111,14 +111,24 @@ Object* Dictionary::get(const Object& key) const noexcept {
   return i == SIZE_MAX ? nullptr : entries_[i].value.get();
 }
 
-Object* Dictionary::get(std::string_view key) const noexcept {
-  size_t h = keyHash(key);
-  size_t i = find(h, [&](const Object& k) {
+size_t Dictionary::findText(std::string_view key) const noexcept {
+  auto matches = [&](const Object& k) {
     if (k.kind() != TypeKind::String) return false;
     const auto& s = static_cast<const String&>(k);
     if (s.isNarrow()) return s.narrow() == key;
     return s.utf8() == key;
-  });
+  };
+  if (index_.empty()) {
+    // A short list is searched by the text alone: hashing it would cost more.
+    for (size_t i = 0; i < entries_.size(); ++i)
+      if (entries_[i].key && matches(*entries_[i].key)) return i;
+    return SIZE_MAX;
+  }
+  return find(keyHash(key), matches);
+}
+
+Object* Dictionary::get(std::string_view key) const noexcept {
+  size_t i = findText(key);
   return i == SIZE_MAX ? nullptr : entries_[i].value.get();
 }
 
@@ -180,12 +190,16 @@ void Dictionary::setValue(Ref<Object> key, Ref<Object> value) {
 }
 
 bool Dictionary::removeValue(const Object& key) {
-  size_t h = key.hash();
-  size_t i = find(h, [&](const Object& k) { return k.isEqual(key); });
+  return removeAt(find(key.hash(), [&](const Object& k) { return k.isEqual(key); }));
+}
+
+bool Dictionary::removeText(std::string_view key) { return removeAt(findText(key)); }
+
+bool Dictionary::removeAt(size_t i) {
   if (i == SIZE_MAX) return false;
   if (!index_.empty()) {
     size_t mask = index_.size() - 1;
-    size_t slot = h & mask;
+    size_t slot = entries_[i].hash & mask;
     while (index_[slot] != i + 1) slot = (slot + 1) & mask;
     index_[slot] = kTombstone;
   }
@@ -229,6 +243,6 @@ void MutableDictionary::set(std::string_view key, Ref<Object> value) {
   set(Ref<Object>(String::make(key)), std::move(value));
 }
 
-bool MutableDictionary::remove(std::string_view key) { return remove(*String::make(key)); }
+bool MutableDictionary::remove(std::string_view key) { return removeText(key); }
 
 }  // namespace qr

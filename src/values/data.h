@@ -43,4 +43,7 @@ class MutableData final : public Data {
   std::vector<uint8_t>& storage() noexcept { return bytes_; }
 };
 
+template <>
+inline constexpr TypeKind kExactKind<Data> = TypeKind::Data;
+
 }  // namespace qr

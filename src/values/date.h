@@ -34,4 +34,7 @@ class Date final : public Object {
   double seconds_;
 };
 
+template <>
+inline constexpr TypeKind kExactKind<Date> = TypeKind::Date;
+
 }  // namespace qr

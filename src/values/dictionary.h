@@ -41,7 +41,7 @@ class Dictionary : public Object {
   Object* get(std::string_view key) const noexcept;
   template <class T>
   T* getAs(std::string_view key) const noexcept {
-    return dynamic_cast<T*>(get(key));
+    return cast<T>(get(key));
   }
   bool contains(const Object& key) const noexcept { return get(key) != nullptr; }
 
@@ -61,12 +61,16 @@ class Dictionary : public Object {
  protected:
   void setValue(Ref<Object> key, Ref<Object> value);
   bool removeValue(const Object& key);
+  bool removeText(std::string_view key);
   void clear() noexcept;
   void reserveEntries(size_t n) { entries_.reserve(n); }
 
  private:
   template <class Match>
   size_t find(size_t hash, Match&& match) const noexcept;
+  // The position of the entry whose key is a string of this text, or SIZE_MAX.
+  size_t findText(std::string_view key) const noexcept;
+  bool removeAt(size_t position);
   void rebuildIndex();
   void compact();
 
@@ -86,5 +90,8 @@ class MutableDictionary final : public Dictionary {
   void removeAll() noexcept { clear(); }
   void reserve(size_t n) { reserveEntries(n); }
 };
+
+template <>
+inline constexpr TypeKind kExactKind<Dictionary> = TypeKind::Dictionary;
 
 }  // namespace qr

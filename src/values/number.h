@@ -34,4 +34,7 @@ class Number final : public Object {
   uint64_t bits_;
 };
 
+template <>
+inline constexpr TypeKind kExactKind<Number> = TypeKind::Number;
+
 }  // namespace qr

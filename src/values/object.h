@@ -121,14 +121,23 @@ Ref<T> make(Args&&... args) {
   return Ref<T>::adopt(new T(std::forward<Args>(args)...));
 }
 
+// The kind that a value class alone reports, set beside each such class, so
+// that a test for it is one virtual call rather than a dynamic_cast. Other
+// for the rest (the mutable subclasses among them).
+template <class T>
+inline constexpr TypeKind kExactKind = TypeKind::Other;
+
 // Kind-of-class test: the object as T, or null.
-template <class T, class U>
-Ref<T> cast(const Ref<U>& r) noexcept {
-  return Ref<T>(dynamic_cast<T*>(r.get()));
-}
 template <class T>
 T* cast(const Object* o) noexcept {
-  return dynamic_cast<T*>(const_cast<Object*>(o));
+  if constexpr (kExactKind<T> != TypeKind::Other)
+    return o && o->kind() == kExactKind<T> ? static_cast<T*>(const_cast<Object*>(o)) : nullptr;
+  else
+    return dynamic_cast<T*>(const_cast<Object*>(o));
+}
+template <class T, class U>
+Ref<T> cast(const Ref<U>& r) noexcept {
+  return Ref<T>(cast<T>(r.get()));
 }
 
 // Value equality where either side may be null (two nulls are equal).

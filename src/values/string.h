@@ -109,4 +109,7 @@ bool decodeUTF8(std::string_view utf8, std::u16string& out);
 void encodeUTF8(std::u16string_view units, std::string& out);
 bool isASCII(std::string_view bytes) noexcept;
 
+template <>
+inline constexpr TypeKind kExactKind<String> = TypeKind::String;
+
 }  // namespace qr

@@ -2,6 +2,7 @@
 
 #include <unistd.h>
 
+#include <algorithm>
 #include <cstring>
 #include <vector>
 
@@ -131,15 +132,15 @@ std::string percentEscapePath(std::string_view bytes) {
 std::optional<std::string> percentDecode(std::string_view text) {
   std::string out;
   out.reserve(text.size());
-  for (size_t i = 0; i < text.size(); ++i) {
-    if (text[i] != '%') {
-      out += text[i];
-      continue;
-    }
-    if (i + 2 >= text.size() + 0 || hexValue(text[i + 1]) < 0 || hexValue(text[i + 2]) < 0)
+  for (size_t i = 0; i < text.size();) {
+    size_t escape = std::min(text.find('%', i), text.size());
+    out.append(text, i, escape - i);
+    if (escape == text.size()) break;
+    if (escape + 2 >= text.size() || hexValue(text[escape + 1]) < 0 ||
+        hexValue(text[escape + 2]) < 0)
       return std::nullopt;
-    out += static_cast<char>(hexValue(text[i + 1]) << 4 | hexValue(text[i + 2]));
-    i += 2;
+    out += static_cast<char>(hexValue(text[escape + 1]) << 4 | hexValue(text[escape + 2]));
+    i = escape + 3;
   }
   return out;
 }
@@ -211,6 +212,14 @@ bool URL::isEqual(const Object& other) const noexcept {
   return relative_ == o.relative_ && equal(base_, o.base_);
 }
 
-size_t URL::hash() const noexcept { return hashCodeUnits(std::string_view(relative_)); }
+size_t URL::hash() const noexcept {
+  // Registries key modules by URL and look each up several times a run.
+  size_t h = hash_.load(std::memory_order_relaxed);
+  if (h == 0) {
+    h = hashCodeUnits(std::string_view(relative_));
+    hash_.store(h, std::memory_order_relaxed);
+  }
+  return h;
+}
 
 }  // namespace qr

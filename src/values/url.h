@@ -3,6 +3,7 @@
 // registries that want one key per location use absoluteURL().
 #pragma once
 
+#include <atomic>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -44,11 +45,15 @@ class URL final : public Object {
   std::string relative_;
   Ref<URL> base_;
   std::string absolute_;
+  mutable std::atomic<size_t> hash_{0};  // 0: not yet computed
 };
 
 // Escapes every byte that may not stand in a URL path as "%XX" (upper-case hex).
 std::string percentEscapePath(std::string_view bytes);
 // Decodes "%XX" escapes; none when an escape is malformed.
 std::optional<std::string> percentDecode(std::string_view text);
+
+template <>
+inline constexpr TypeKind kExactKind<URL> = TypeKind::URL;
 
 }  // namespace qr

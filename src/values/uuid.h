@@ -31,4 +31,7 @@ class UUID final : public Object {
   Bytes bytes_;
 };
 
+template <>
+inline constexpr TypeKind kExactKind<UUID> = TypeKind::UUID;
+
 }  // namespace qr

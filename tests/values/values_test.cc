@@ -120,6 +120,13 @@ TEST(URL, FileURLsEscapeResolveAndDecode) {
     auto path = r.url ? r.url->fileSystemPath() : std::nullopt;
     EXPECT_EQ(path.value_or(""), r.path ? r.path : "") << (r.absolute ? r.absolute : "");
   }
+  // Text to decode, and what it decodes to ("!" for malformed).
+  const std::pair<std::string_view, std::string_view> escapes[] = {
+      {"", ""},     {"a%41b", "aAb"}, {"%2f%2F", "//"},    {"%41", "A"},  {"ab", "ab"},
+      {"%", "!"},   {"a%", "!"},      {"%4", "!"},         {"ab%2", "!"}, {"%%41", "!"},
+      {"%G1", "!"}, {"%1G", "!"},     {"x%00", {"x\0", 2}}};
+  for (auto [text, decoded] : escapes)
+    EXPECT_EQ(percentDecode(text).value_or("!"), decoded) << text;
 }
 
 TEST(DeepCopy, ATreeServesAsItsOwnCopyOnlyWhenNothingElseHoldsAnyOfIt) {
