@@ -3,6 +3,10 @@
 // reader would accept, and the bounds on nesting and expansion.
 #include <gtest/gtest.h>
 #include <malloc.h>
+#include <sys/mman.h>
+#include <unistd.h>
+
+#include <cstring>
 
 #include "plist/property_list.h"
 #include "plist/xml_expat_reader.h"
@@ -110,6 +114,26 @@ TEST(XMLPropertyList, PlainScannerReadsWhatExpatReadsOrDeclines) {
       EXPECT_TRUE(identical(scan.value.get(), expat.get(), &m)) << doc;
     }
   }
+  // Every prefix of the short rows, placed against an unreadable page so that
+  // a read past the end faults: whatever the scanner makes of it, expat agrees.
+  const size_t page = size_t(sysconf(_SC_PAGESIZE));
+  auto* pages = static_cast<char*>(
+      mmap(nullptr, 2 * page, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0));
+  ASSERT_NE(pages, MAP_FAILED);
+  ASSERT_EQ(mprotect(pages + page, page, PROT_NONE), 0);
+  for (const auto& row : rows) {
+    const std::string& doc = row.first;
+    for (size_t n = 0; doc.size() <= page && n <= doc.size(); ++n) {
+      std::string_view text(pages + page - n, n);
+      std::memcpy(pages + page - n, doc.data(), n);
+      PlainScan scan = xmlplist::scanPlainXMLPropertyList(text, Mutability::Immutable);
+      if (scan.outcome == No) continue;
+      Ref<Object> expat = readXMLPropertyListWithExpat(text, Mutability::Immutable);
+      EXPECT_TRUE(identical(scan.value.get(), expat.get())) << doc.substr(0, n);
+      EXPECT_EQ(bool(expat), scan.outcome == Read) << doc.substr(0, n);
+    }
+  }
+  munmap(pages, 2 * page);
 }
 
 TEST(PropertyList, ReadsWhatOtherWritersWrite) {
