@@ -173,8 +173,8 @@ Ref<URL> URL::fileURL(std::string_view path, bool isDirectory, const Ref<URL>& b
 }
 
 Ref<URL> URL::absoluteURL() const {
-  // URLs never change, so one that already is its absolute form stands for it.
-  if (!base_ && relative_ == absolute_) return Ref<URL>(const_cast<URL*>(this));
+  // Without a base a URL is its own absolute form, and URLs never change.
+  if (!base_) return Ref<URL>(const_cast<URL*>(this));
   return Ref<URL>::adopt(new URL(absolute_, nullptr));
 }
 

@@ -26,7 +26,7 @@ class URL final : public Object {
   const std::string& relativeString() const noexcept { return relative_; }
   const Ref<URL>& baseURL() const noexcept { return base_; }
   const std::string& absoluteString() const noexcept { return absolute_; }
-  // The URL of the absolute string, with no base (this one when it is that already).
+  // The URL of the absolute string, with no base (this one when it has none).
   Ref<URL> absoluteURL() const;
   bool hasDirectoryPath() const noexcept;
   bool isFileURL() const noexcept;

@@ -3,6 +3,9 @@
 // no property lists.
 #include <gtest/gtest.h>
 
+#include <unistd.h>
+
+#include <cstdlib>
 #include <functional>
 
 #include "support/plist_identity.h"
@@ -120,6 +123,14 @@ TEST(URL, FileURLsEscapeResolveAndDecode) {
     auto path = r.url ? r.url->fileSystemPath() : std::nullopt;
     EXPECT_EQ(path.value_or(""), r.path ? r.path : "") << (r.absolute ? r.absolute : "");
   }
+  // A relative path is taken from the current directory, and relative text
+  // replaces the last segment of a base that does not end in "/".
+  char* cwd = getcwd(nullptr, 0);
+  ASSERT_TRUE(cwd);
+  EXPECT_EQ(URL::fileURL("P r.plugin", true)->absoluteString(),
+            "file://" + percentEscapePath(cwd) + "/P%20r.plugin/");
+  free(cwd);
+  EXPECT_EQ(URL::withString("c", URL::withString("file:///a/b"))->absoluteString(), "file:///a/c");
   // Text to decode, and what it decodes to ("!" for malformed).
   const std::pair<std::string_view, std::string_view> escapes[] = {
       {"", ""},     {"a%41b", "aAb"}, {"%2f%2F", "//"},    {"%41", "A"},  {"ab", "ab"},
