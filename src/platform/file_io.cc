@@ -8,13 +8,6 @@
 
 namespace qr {
 
-bool readAll(int fd, std::string& out) {
-  InputBuffer input;
-  bool ok = input.readAll(fd);
-  out.append(input.view());
-  return ok;
-}
-
 bool InputBuffer::readAll(int fd) {
   struct stat st;
   size_t expected = ::fstat(fd, &st) == 0 && S_ISREG(st.st_mode) && st.st_size > 0
@@ -49,14 +42,11 @@ bool writeAll(int fd, std::string_view bytes) {
 std::optional<std::string> readFile(const std::string& path) {
   int fd = ::open(path.c_str(), O_RDONLY | O_CLOEXEC);
   if (fd < 0) return std::nullopt;
-  std::string out;
-  struct stat st;
-  if (::fstat(fd, &st) == 0 && S_ISREG(st.st_mode) && st.st_size > 0)
-    out.reserve(static_cast<size_t>(st.st_size));
-  bool ok = readAll(fd, out);
+  InputBuffer input;  // sized from the file's length
+  bool ok = input.readAll(fd);
   ::close(fd);
   if (!ok) return std::nullopt;
-  return out;
+  return std::string(input.view());
 }
 
 bool writeFile(const std::string& path, std::string_view bytes) {

@@ -15,9 +15,6 @@ std::optional<std::string> readFile(const std::string& path);
 bool writeFile(const std::string& path, std::string_view bytes);
 // Writes every byte, retrying interrupted calls and short counts.
 bool writeAll(int fd, std::string_view bytes);
-// Reads until end of file; false on an error other than EINTR (what was read stays in out).
-bool readAll(int fd, std::string& out);
-
 // Bytes read to the end of a descriptor into memory never written before:
 // for inputs of many megabytes, where zeroing a string first would touch
 // every page twice.
