@@ -81,6 +81,11 @@ TEST_F(ModuleCache, AnEntryServesOnlyWhileItsBundleVersionIsUnchanged) {
     EXPECT_EQ(log.lines().empty(), *r.stored && *r.now);
     for (const auto& line : log.lines())
       EXPECT_EQ(line, "Module is missing short version: " + url->absoluteString());
+    // Dropping an entry marks the cache changed only when there was one to drop.
+    cache->setDirty(false);
+    cache->removeEntry(url.get());
+    EXPECT_EQ(cache->dirty(), r.kept);
+    EXPECT_EQ(cache->cacheDictionary()->count(), 1u);
   }
 }
 
