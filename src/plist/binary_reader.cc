@@ -5,6 +5,7 @@
 // from expanding without bound.
 #include <algorithm>
 #include <cstring>
+#include <span>
 #include <vector>
 
 #include "plist/binary_trailer.h"
@@ -233,8 +234,9 @@ class BinaryReader {
       return make<Array>(std::move(items));
     }
     if (!bodyFits(h, 2 * trailer_.refSize)) return nullptr;
-    std::vector<std::pair<Ref<Object>, Ref<Object>>> pairs;
-    pairs.reserve(h.count);
+    // The pairs go on a stack shared by every level; a nested container takes
+    // its own off again. After a failure the reader is of no further use.
+    size_t base = pairs_.size();
     for (uint64_t i = 0; i < h.count; ++i) {
       auto k = key(reference(h, i));
       if (!k) return nullptr;
@@ -242,12 +244,19 @@ class BinaryReader {
       if (r >= trailer_.objectCount) return nullptr;
       auto v = child(r, depth + 1);
       if (!v) return nullptr;
-      pairs.emplace_back(std::move(k), std::move(v));
+      pairs_.emplace_back(std::move(k), std::move(v));
     }
-    if (!mutableContainers) return Dictionary::build(std::move(pairs));
-    auto d = make<MutableDictionary>();
-    d->reserve(pairs.size());
-    for (auto& [k, v] : pairs) d->set(std::move(k), std::move(v));  // a repeated key: last wins
+    auto pairs = std::span(pairs_).subspan(base);
+    Ref<Object> d;
+    if (!mutableContainers) {
+      d = Dictionary::build(pairs);
+    } else {
+      auto m = make<MutableDictionary>();
+      m->reserve(pairs.size());
+      for (auto& [k, v] : pairs) m->set(std::move(k), std::move(v));  // a repeated key: last wins
+      d = std::move(m);
+    }
+    pairs_.resize(base);
     return d;
   }
 
@@ -339,6 +348,7 @@ class BinaryReader {
   bplist::Trailer trailer_;
   Mutability mutability_;
   std::vector<Slot> slots_;
+  std::vector<std::pair<Ref<Object>, Ref<Object>>> pairs_;
   uint64_t nodeBudget_;
   uint64_t payloadBudget_;
   uint64_t nodes_ = 0;

@@ -1,6 +1,7 @@
 #include "plist/xml_value_builder.h"
 
 #include <iterator>
+#include <span>
 
 #include "plist/xml_leaf_text.h"
 #include "values/array.h"
@@ -94,12 +95,13 @@ Ref<Object> ValueBuilder::closeDictionary(size_t start) {
     values_.resize(start);
     return d;
   }
-  std::vector<std::pair<Ref<Object>, Ref<Object>>> pairs;
-  pairs.reserve(n);
+  pairs_.clear();
   for (size_t i = start; i < values_.size(); i += 2)
-    pairs.emplace_back(std::move(values_[i]), std::move(values_[i + 1]));
+    pairs_.emplace_back(std::move(values_[i]), std::move(values_[i + 1]));
   values_.resize(start);
-  return Dictionary::build(std::move(pairs));
+  auto d = Dictionary::build(std::span(pairs_));
+  pairs_.clear();
+  return d;
 }
 
 }  // namespace qr::xmlplist

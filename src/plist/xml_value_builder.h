@@ -6,6 +6,7 @@
 
 #include <cstdint>
 #include <string_view>
+#include <utility>
 #include <vector>
 
 #include "plist/xml_string_table.h"
@@ -143,6 +144,8 @@ class ValueBuilder {
   Tag leaf_ = Tag::Unknown;
   std::vector<Frame> frames_;
   std::vector<Ref<Object>> values_;
+  // Where a closing dictionary's pairs are gathered, kept for the next one.
+  std::vector<std::pair<Ref<Object>, Ref<Object>>> pairs_;
   Ref<Object> root_;
   // Every key, and short immutable string values, are shared within the parse.
   static constexpr size_t kShortString = 32;

@@ -60,6 +60,10 @@ size_t keyHash(std::string_view key) {
 Dictionary::~Dictionary() = default;
 
 Ref<Dictionary> Dictionary::build(std::vector<std::pair<Ref<Object>, Ref<Object>>> pairs) {
+  return build(std::span(pairs));
+}
+
+Ref<Dictionary> Dictionary::build(std::span<std::pair<Ref<Object>, Ref<Object>>> pairs) {
   auto d = Ref<Dictionary>::adopt(new Dictionary());
   d->entries_.reserve(pairs.size());
   for (auto& [k, v] : pairs) d->setValue(std::move(k), std::move(v));

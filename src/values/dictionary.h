@@ -3,6 +3,7 @@
 // larger ones keep an open-addressing index beside the entry list.
 #pragma once
 
+#include <span>
 #include <string_view>
 #include <utility>
 #include <vector>
@@ -29,6 +30,8 @@ class Dictionary : public Object {
   // An immutable dictionary of the pairs in order; a repeated key keeps its
   // first position and its last value.
   static Ref<Dictionary> build(std::vector<std::pair<Ref<Object>, Ref<Object>>> pairs);
+  // The same, moving the pairs out of a buffer the caller keeps using.
+  static Ref<Dictionary> build(std::span<std::pair<Ref<Object>, Ref<Object>>> pairs);
   // Shallow copies: keys and values are shared.
   Ref<Dictionary> copy() const;
   Ref<MutableDictionary> mutableCopy() const;
