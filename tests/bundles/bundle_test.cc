@@ -121,6 +121,12 @@ TEST(BundleCache, UnchangedInfoIsSharedAndEveryChangeIsSeen) {
   fs::remove(info);
   EXPECT_EQ(version(), "(null)");
   EXPECT_EQ(describe(first->shortVersionString()), "1.1") << "earlier objects keep their snapshot";
+  // Gone while the cache kept it: forgotten, and the thousand bundles
+  // opened next push nothing out that is no longer there.
+  fs::remove_all(bundle);
+  EXPECT_FALSE(Bundle::open(bundle));
+  for (std::string other = dir.path(); other.size() < dir.path().size() + 2200;)
+    ASSERT_TRUE(Bundle::open(other += "/."));
 }
 
 TEST(PlugIn, FactoriesOfATypeComeInThePlugInsOrderWithoutMalformedOnes) {
