@@ -1,8 +1,9 @@
 // The binary "bplist00" writer, for frames on a pipe more than for files.
 //
 // One walk over the value numbers every object (the top one first) and notes
-// each container's references; dictionary keys that are equal are numbered
-// once, which is most of the saving on cache-like data. The count then fixes
+// each container's references; equal keys, and equal short strings (kinds,
+// makes, versions), are numbered once, which is most of the saving on
+// cache-like data and spares the reader as many objects. The count then fixes
 // the size of a reference, and so the exact size of the file: the second pass
 // is a plain loop over the numbered objects into one buffer of that size.
 #include <algorithm>
@@ -16,6 +17,7 @@
 
 #include "plist/binary_trailer.h"
 #include "plist/property_list.h"
+#include "plist/quick_text_hash.h"
 #include "values/array.h"
 #include "values/boolean.h"
 #include "values/data.h"
@@ -129,33 +131,42 @@ size_t leafSize(const Object& v, TypeKind kind) noexcept {
 
 class BinaryWriter {
  public:
-  bool collect(const Object& v, size_t depth);
+  // The object's number; none for a value that cannot be written.
+  std::optional<size_t> collect(const Object& v, size_t depth);
   std::optional<std::string> write();
 
  private:
-  struct KeySlot {
-    size_t hash;
-    size_t item;  // 0 for an empty slot: a key is never the top object
+  struct StringSlot {
+    uint64_t hash;
+    size_t item;  // 0 for an empty slot: a string is never the top object
   };
-  struct SeenKey {
-    const String* key;
+  struct SeenString {
+    const String* string;
     size_t item;
   };
 
+  // Longer strings are rarely repeated, and hashing them all would cost more
+  // than their sharing saves.
+  static constexpr size_t kSharedStringLength = 32;
+  // How far a lookup probes before it gives up sharing the string.
+  static constexpr size_t kMaxProbes = 32;
+
   size_t add(const Object& v, size_t bytes);
-  size_t key(const String& k);
+  size_t shared(const String& s);
 
   std::vector<const Object*> items_;  // in the order they are numbered
   // For each container in turn, its count as collected, then its references.
   std::vector<size_t> refs_;
   size_t refCount_ = 0;
-  std::vector<KeySlot> keys_;
-  size_t keyCount_ = 0;
-  // Keys read from a file are one shared object each; remembering recent ones
-  // by address saves hashing them again.
-  SeenKey seen_[64] = {};
-  size_t bytes_ = 0;     // of every object but its references
-  size_t lastSize_ = 0;  // of the last object, which holds no references
+  std::vector<StringSlot> strings_;
+  size_t stringCount_ = 0;
+  // Strings read from a file are one shared object each; remembering recent
+  // ones by address saves hashing them again.
+  SeenString seen_[64] = {};
+  size_t bytes_ = 0;  // of every object but its references
+  // Of the last object numbered, without its references: the table offset
+  // less this bounds where that object starts.
+  size_t lastSize_ = 0;
 };
 
 size_t BinaryWriter::add(const Object& v, size_t bytes) {
@@ -165,58 +176,69 @@ size_t BinaryWriter::add(const Object& v, size_t bytes) {
   return items_.size() - 1;
 }
 
-// The number of the key's first occurrence, from an open-addressing table on
-// the strings' keyed hash (outside input chooses the keys).
-size_t BinaryWriter::key(const String& k) {
-  SeenKey& seen = seen_[(reinterpret_cast<uintptr_t>(&k) >> 4) % std::size(seen_)];
-  if (seen.key == &k) return seen.item;
-  if (2 * (keyCount_ + 1) > keys_.size()) {
-    std::vector<KeySlot> old(std::max<size_t>(64, 2 * keys_.size()), KeySlot{0, 0});
-    old.swap(keys_);
-    size_t mask = keys_.size() - 1;
-    for (const KeySlot& s : old) {
-      if (!s.item) continue;
-      size_t i = s.hash & mask;
-      while (keys_[i].item) i = (i + 1) & mask;
-      keys_[i] = s;
+// The number of the string's first occurrence, from an open-addressing table
+// on a quick hash of its stored units. Sharing only saves room: text made to
+// collide is numbered anew rather than searched for at length, and equal
+// strings stored one narrow, one wide are simply written twice.
+size_t BinaryWriter::shared(const String& s) {
+  SeenString& seen = seen_[(reinterpret_cast<uintptr_t>(&s) >> 4) % std::size(seen_)];
+  if (seen.string == &s) return seen.item;
+  if (2 * (stringCount_ + 1) > strings_.size()) {
+    std::vector<StringSlot> old(std::max<size_t>(64, 2 * strings_.size()), StringSlot{0, 0});
+    old.swap(strings_);
+    size_t mask = strings_.size() - 1;
+    for (const StringSlot& slot : old) {
+      if (!slot.item) continue;
+      size_t i = slot.hash & mask;
+      while (strings_[i].item) i = (i + 1) & mask;
+      strings_[i] = slot;
     }
   }
-  size_t h = k.hash(), mask = keys_.size() - 1;
-  for (size_t i = h & mask;; i = (i + 1) & mask) {
-    KeySlot& s = keys_[i];
-    if (!s.item) {
-      s = {h, add(k, stringSize(k))};
-      ++keyCount_;
-    } else if (s.hash != h || !items_[s.item]->isEqual(k)) {
+  std::string_view units =
+      s.isNarrow()
+          ? s.narrow()
+          : std::string_view(reinterpret_cast<const char*>(s.wide().data()), 2 * s.wide().size());
+  uint64_t h = quickTextHash(units) ^ (s.isNarrow() ? 0 : 1);
+  size_t mask = strings_.size() - 1, item = 0;
+  for (size_t i = h & mask, probes = 0; probes < kMaxProbes; i = (i + 1) & mask, ++probes) {
+    StringSlot& slot = strings_[i];
+    if (!slot.item) {
+      slot = {h, add(s, stringSize(s))};
+      ++stringCount_;
+    } else if (slot.hash != h || !items_[slot.item]->isEqual(s)) {
       continue;
     }
-    seen = {&k, s.item};
-    return s.item;
+    item = slot.item;
+    break;
   }
+  if (!item) item = add(s, stringSize(s));  // not shared
+  seen = {&s, item};
+  return item;
 }
 
-bool BinaryWriter::collect(const Object& v, size_t depth) {
-  if (depth > kMaxPropertyListDepth) return false;
+std::optional<size_t> BinaryWriter::collect(const Object& v, size_t depth) {
+  if (depth > kMaxPropertyListDepth) return std::nullopt;
   TypeKind kind = v.kind();
   if (kind == TypeKind::Array) {
     const auto& a = static_cast<const Array&>(v);
     size_t n = a.count();
-    add(v, countedMarkerSize(n));
+    size_t number = add(v, countedMarkerSize(n));
     refs_.push_back(n);
     size_t first = refs_.size();
     refs_.resize(first + n);
     refCount_ += n;
     for (size_t i = 0; i < n; ++i) {
-      refs_[first + i] = items_.size();
       const Object* item = a.at(i);
-      if (!item || !collect(*item, depth + 1)) return false;
+      auto r = item ? collect(*item, depth + 1) : std::nullopt;
+      if (!r) return std::nullopt;
+      refs_[first + i] = *r;
     }
-    return true;
+    return number;
   }
   if (kind == TypeKind::Dictionary) {
     const auto& d = static_cast<const Dictionary&>(v);
     size_t n = d.count(), i = 0;
-    add(v, countedMarkerSize(n));
+    size_t number = add(v, countedMarkerSize(n));
     refs_.push_back(n);
     size_t first = refs_.size();
     refs_.resize(first + 2 * n);  // the keys, then the values
@@ -227,16 +249,21 @@ bool BinaryWriter::collect(const Object& v, size_t depth) {
         ok = false;
         return;
       }
-      refs_[first + i] = key(static_cast<const String&>(k));
-      refs_[first + n + i++] = items_.size();
-      ok = collect(value, depth + 1);
+      refs_[first + i] = shared(static_cast<const String&>(k));
+      auto r = collect(value, depth + 1);
+      ok = r.has_value();
+      if (ok) refs_[first + n + i++] = *r;
     });
-    return ok && i == n;
+    if (!ok || i != n) return std::nullopt;
+    return number;
   }
+  // The top object is number 0, which the table takes for an empty slot.
+  if (kind == TypeKind::String && depth > 1 &&
+      static_cast<const String&>(v).length() <= kSharedStringLength)
+    return shared(static_cast<const String&>(v));
   size_t size = leafSize(v, kind);
-  if (size == 0) return false;  // URLs, UUIDs and every other object
-  add(v, size);
-  return true;
+  if (size == 0) return std::nullopt;  // URLs, UUIDs and every other object
+  return add(v, size);
 }
 
 std::optional<std::string> BinaryWriter::write() {

@@ -2,27 +2,10 @@
 
 #include <cstring>
 
+#include "plist/quick_text_hash.h"
+
 namespace qr::xmlplist {
 namespace {
-
-// A word-at-a-time hash private to the table; it need not match String::hash.
-uint64_t hashText(std::string_view s) noexcept {
-  uint64_t h = 0x9E3779B97F4A7C15ull ^ s.size();
-  const char* p = s.data();
-  size_t n = s.size();
-  for (; n >= 8; p += 8, n -= 8) {
-    uint64_t w;
-    std::memcpy(&w, p, 8);
-    h = (h ^ w) * 0xBF58476D1CE4E5B9ull;
-    h ^= h >> 31;
-  }
-  if (n) {
-    uint64_t w = 0;
-    std::memcpy(&w, p, n);
-    h = (h ^ w) * 0x94D049BB133111EBull;
-  }
-  return h ^ (h >> 29);
-}
 
 // Crafted text could make many strings collide; a lookup that has probed
 // this far gives up sharing rather than let the parse turn quadratic.
@@ -47,7 +30,7 @@ Ref<String> StringTable::intern(std::string_view ascii) {
   if (recent && recent->narrow() == ascii) return Ref<String>(recent);
   if (!isASCII(ascii)) return nullptr;
   if (slots_.empty()) grow();
-  uint64_t h = hashText(ascii);
+  uint64_t h = quickTextHash(ascii);
   size_t mask = slots_.size() - 1;
   size_t i = h & mask;
   for (size_t probes = 0; probes < kMaxProbes; ++probes, i = (i + 1) & mask) {

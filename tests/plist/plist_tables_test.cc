@@ -295,6 +295,23 @@ TEST(PropertyList, OnlyPropertyListsThatReadBackAreWritten) {
   }
 }
 
+TEST(BinaryPropertyList, EqualKeysAndShortStringsAreWrittenOnce) {
+  // Distinct objects of equal text, as a tree built in memory holds them.
+  const std::string shortText(32, 's'), longText(33, 'l');
+  auto tree = A({D({{longText, S(shortText)}}), D({{longText, S(shortText)}}), S(longText),
+                 S(longText), S(shortText)});
+  auto back = cast<Array>(readBinaryPropertyList(*writeBinaryPropertyList(*tree), {}));
+  ASSERT_TRUE(back && back->isEqual(*tree));
+  auto first = cast<Dictionary>(back->at(0)), second = cast<Dictionary>(back->at(1));
+  EXPECT_EQ(first->keys()[0], second->keys()[0]);
+  EXPECT_EQ(first->get(longText), second->get(longText));
+  EXPECT_EQ(first->get(longText), back->at(4));
+  EXPECT_NE(back->at(2), back->at(3)) << "long values are not looked for";
+  // A string alone is the file's one object.
+  auto alone = writeBinaryPropertyList(*S(shortText));
+  EXPECT_EQ(be(1, 8), alone->substr(alone->size() - 24, 8));
+}
+
 TEST(PropertyList, EveryReaderBoundsNestingAndBinaryResultsShareNothingMutable) {
   // The top value is at depth 1: a value may sit at the bound, not past it.
   const std::tuple<std::string, std::string, std::string> nests[] = {

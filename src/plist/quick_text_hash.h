@@ -1,0 +1,31 @@
+// A word-at-a-time hash of text, for the tables that share equal strings
+// within one read or one write. It is not keyed: outside input chooses the
+// text, so every table that uses it bounds its probes and stops sharing,
+// rather than slowing down, when text collides.
+#pragma once
+
+#include <cstdint>
+#include <cstring>
+#include <string_view>
+
+namespace qr {
+
+inline uint64_t quickTextHash(std::string_view s) noexcept {
+  uint64_t h = 0x9E3779B97F4A7C15ull ^ s.size();
+  const char* p = s.data();
+  size_t n = s.size();
+  for (; n >= 8; p += 8, n -= 8) {
+    uint64_t w;
+    std::memcpy(&w, p, 8);
+    h = (h ^ w) * 0xBF58476D1CE4E5B9ull;
+    h ^= h >> 31;
+  }
+  if (n) {
+    uint64_t w = 0;
+    std::memcpy(&w, p, n);
+    h = (h ^ w) * 0x94D049BB133111EBull;
+  }
+  return h ^ (h >> 29);
+}
+
+}  // namespace qr
