@@ -1,7 +1,7 @@
 // Property-list throughput and memory on a cache-like dictionary: 10,000
 // module entries keyed by module URL, each with a bundle version and eight
 // connection types of two five-string browser-info dictionaries (about 94 MB
-// as XML, 46 MB as plistlib's binary, 56 MB as ours, which shares only keys).
+// as XML, 46 MB as binary, ours or plistlib's).
 // Each operation runs in a forked child, which reports its time and its peak
 // resident memory above what it started with (the input already loaded), so
 // the figures of one operation never mix with another's. With libplist
