@@ -245,12 +245,12 @@ int main(int argc, char** argv) {
   });
   rows.emplace_back("XML write, built", "", writeXML(*cache));
 
+#ifdef QUARRIN_HAVE_LIBPLIST
   auto named = [&](const char* name) -> Operation& {
     for (Row& r : rows)
       if (std::strcmp(r.name, name) == 0) return r.theirs;
     std::abort();
   };
-#ifdef QUARRIN_HAVE_LIBPLIST
   named("XML read") = named("XML read, mutable") = [&](Stopwatch& watch) -> std::optional<size_t> {
     plist_t p = nullptr;
     plist_from_xml(xml.data(), uint32_t(xml.size()), &p);

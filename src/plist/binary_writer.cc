@@ -17,7 +17,7 @@
 
 #include "plist/binary_trailer.h"
 #include "plist/property_list.h"
-#include "plist/quick_text_hash.h"
+#include "plist/sharing_table.h"
 #include "values/array.h"
 #include "values/boolean.h"
 #include "values/data.h"
@@ -183,22 +183,14 @@ size_t BinaryWriter::add(const Object& v, size_t bytes) {
 size_t BinaryWriter::shared(const String& s) {
   SeenString& seen = seen_[(reinterpret_cast<uintptr_t>(&s) >> 4) % std::size(seen_)];
   if (seen.string == &s) return seen.item;
-  if (2 * (stringCount_ + 1) > strings_.size()) {
-    std::vector<StringSlot> old(std::max<size_t>(64, 2 * strings_.size()), StringSlot{0, 0});
-    old.swap(strings_);
-    size_t mask = strings_.size() - 1;
-    for (const StringSlot& slot : old) {
-      if (!slot.item) continue;
-      size_t i = slot.hash & mask;
-      while (strings_[i].item) i = (i + 1) & mask;
-      strings_[i] = slot;
-    }
-  }
+  if (2 * (stringCount_ + 1) > strings_.size())
+    rehashTable(strings_, std::max<size_t>(64, 2 * strings_.size()),
+                [](const StringSlot& slot) { return slot.item != 0; });
   std::string_view units =
       s.isNarrow()
           ? s.narrow()
           : std::string_view(reinterpret_cast<const char*>(s.wide().data()), 2 * s.wide().size());
-  uint64_t h = quickTextHash(units) ^ (s.isNarrow() ? 0 : 1);
+  uint64_t h = quickTextHash(units);
   size_t mask = strings_.size() - 1, item = 0;
   for (size_t i = h & mask, probes = 0; probes < kMaxProbes; i = (i + 1) & mask, ++probes) {
     StringSlot& slot = strings_[i];

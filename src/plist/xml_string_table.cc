@@ -2,7 +2,7 @@
 
 #include <cstring>
 
-#include "plist/quick_text_hash.h"
+#include "plist/sharing_table.h"
 
 namespace qr::xmlplist {
 namespace {
@@ -50,15 +50,8 @@ Ref<String> StringTable::intern(std::string_view ascii) {
 }
 
 void StringTable::grow() {
-  std::vector<Slot> old = std::move(slots_);
-  slots_.assign(old.empty() ? 256 : old.size() * 2, Slot());
-  size_t mask = slots_.size() - 1;
-  for (const Slot& s : old) {
-    if (!s.string) continue;
-    size_t i = s.hash & mask;
-    while (slots_[i].string) i = (i + 1) & mask;
-    slots_[i] = s;
-  }
+  rehashTable(slots_, slots_.empty() ? 256 : 2 * slots_.size(),
+              [](const Slot& s) { return s.string != nullptr; });
 }
 
 }  // namespace qr::xmlplist

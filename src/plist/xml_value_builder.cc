@@ -99,9 +99,7 @@ Ref<Object> ValueBuilder::closeDictionary(size_t start) {
   for (size_t i = start; i < values_.size(); i += 2)
     pairs_.emplace_back(std::move(values_[i]), std::move(values_[i + 1]));
   values_.resize(start);
-  auto d = Dictionary::build(std::span(pairs_));
-  pairs_.clear();
-  return d;
+  return Dictionary::build(std::span(pairs_));
 }
 
 }  // namespace qr::xmlplist
