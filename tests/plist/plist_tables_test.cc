@@ -279,7 +279,7 @@ TEST(PropertyList, OnlyPropertyListsThatReadBackAreWritten) {
       {String::fromUTF16(u"\xD800\xD800"), true, false}, {make<Date>(NAN), true, false},
       {Date::fromUnixTime(-62167219201.0), true, false},
       {Date::fromUnixTime(253402300800.), true, false},
-      {S("\t\n\r\x7F\xEF\xBF\xBD"), true, true},
+      {S("\t\n\r\x7F\xEF\xBF\xBD"), true, true}, {S("\xC2\x80"), true, true},
       {Date::fromISO8601("0000-01-01T00:00:00Z"), true, true}};
   // clang-format on
   for (const auto& [v, plist, written] : rows) {
