@@ -1,9 +1,7 @@
 #include "tool/discovery.h"
 
 #include <fnmatch.h>
-#include <fts.h>
 
-#include <cstring>
 #include <optional>
 #include <string>
 #include <vector>
@@ -13,6 +11,7 @@
 #include "modules/module_factory.h"
 #include "modules/pbm_module.h"
 #include "modules/pm_module.h"
+#include "platform/directory_walk.h"
 #include "platform/locations.h"
 #include "plist/property_list.h"
 #include "store/prefs_store.h"
@@ -83,32 +82,17 @@ void discoverModules(int maxLevel, PMHost& pmHost, IOMHost& iomHost, PBMHost& pb
   std::vector<std::string> excluded = settingsList(*settings, "PM Exclude Directories");
   std::vector<std::string> patterns = settingsList(*settings, "PM Exclude Matches");
 
-  std::vector<char*> argv;
-  for (auto& root : roots) argv.push_back(root.data());
-  argv.push_back(nullptr);
-  // Logical walk: symbolic links are followed and reported under their own path.
-  FTS* walk = fts_open(argv.data(), FTS_LOGICAL | FTS_NOSTAT, nullptr);
-  if (!walk) return;
-  while (FTSENT* entry = fts_read(walk)) {
-    if (entry->fts_info != FTS_D) continue;
-    if (entry->fts_level >= maxLevel) {
-      fts_set(walk, entry, FTS_SKIP);
-      continue;
-    }
-    const char* path = entry->fts_path;
-    bool skip = false;
-    for (const auto& dir : excluded) skip = skip || dir == path;
-    for (const auto& pattern : patterns) skip = skip || fnmatch(pattern.c_str(), path, 0) == 0;
-    if (skip) {
-      fts_set(walk, entry, FTS_SKIP);
-      continue;
-    }
-    if (fnmatch("*.plugin", path, 0) != 0) continue;
-    registerBundle(path, pmHost, iomHost, pbmHost);
+  walkDirectories(roots, [&](const std::string& path, int level) {
+    if (level >= maxLevel) return false;
+    for (const auto& dir : excluded)
+      if (dir == path) return false;
+    for (const auto& pattern : patterns)
+      if (fnmatch(pattern.c_str(), path.c_str(), 0) == 0) return false;
+    if (fnmatch("*.plugin", path.c_str(), 0) != 0) return true;
+    registerBundle(path.c_str(), pmHost, iomHost, pbmHost);
     // Plug-in bundles are never entered, so nested plug-ins are never found.
-    fts_set(walk, entry, FTS_SKIP);
-  }
-  fts_close(walk);
+    return false;
+  });
 }
 
 }  // namespace qr

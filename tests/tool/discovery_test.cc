@@ -26,9 +26,12 @@ const char kOther[] = "11111111-2222-3333-4444-666666666666";
 void lay(const std::string& root, const std::string& item) {
   std::string path = root + "/" + item.substr(2);
   if (item[0] == 'f') return qrtest::writeText(path, "plain");
-  if (item[0] == 'l')
+  if (item[0] == 'l') {
+    std::filesystem::path link = path.substr(0, path.find('='));
+    std::filesystem::create_directories(link.parent_path());
     return std::filesystem::create_directory_symlink(root + "/" + path.substr(path.find('=') + 1),
-                                                     path.substr(0, path.find('=')));
+                                                     link);
+  }
   std::vector<qrtest::PluginDeclaration> types{
       {item[0] == 'b' ? QR_PBM_TYPE_ID : QR_PM_TYPE_ID, {kFactory}}};
   if (item[0] == 'i') types.push_back({QR_IOM_TYPE_ID, {kOther}});
@@ -59,7 +62,8 @@ TEST(Discovery, EachCaseFindsExactlyItsModules) {
       {"p:P/Foo/A.plugin", "P/Foo/", "P/Foo", "p:P/Foo/A.plugin"},
       {"p:E/Real.plugin p:P/Here.plugin l:P/Link.plugin=E/Real.plugin l:P/loop=P", "P", "",
        "p:P/Here.plugin p:P/Link.plugin"},
-      {"p:P/A.plugin", "missing P", "", "p:P/A.plugin"},
+      {"p:E/V/In.plugin l:P/Vendor=E/V l:P/a/up=P l:P/dead=gone", "P", "", "p:P/Vendor/In.plugin"},
+      {"p:P/A.plugin", "missing - P", "", "p:P/A.plugin"},  // "-": an empty root
       {"p:R/One.plugin p:R/a/Two.plugin p:R/a/b/Three.plugin", "R", "", "p:R/One.plugin", 2},
       {"p:R/One.plugin p:R/a/Two.plugin p:R/a/b/Three.plugin", "R", "",
        "p:R/One.plugin p:R/a/Two.plugin", 3},
@@ -76,7 +80,8 @@ TEST(Discovery, EachCaseFindsExactlyItsModules) {
     setPrintingPref(*String::make("support_quarrin"), *String::make(r.gate), 5);
     for (const auto& item : words(r.tree)) lay(dir.path(), item);
     std::string roots, excluded, patterns;
-    for (const auto& path : words(r.roots)) roots += "<string>" + (dir / path) + "</string>";
+    for (const auto& path : words(r.roots))
+      roots += "<string>" + (path == "-" ? "" : dir / path) + "</string>";
     for (const auto& path : words(r.skip))
       (path[0] == '*' ? patterns : excluded) +=
           "<string>" + (path[0] == '*' ? path : dir / path) + "</string>";
