@@ -158,13 +158,17 @@ void QuarrinModuleCache::addInfo(const Array* info, const URL* forPrinterModule,
   dirty_ = true;
 }
 
-Ref<MutableArray> QuarrinModuleCache::getInfoForPrinterModule(const URL* module,
-                                                              const String* andConnection) {
+Ref<Array> QuarrinModuleCache::recordedInfoForPrinterModule(const URL* module,
+                                                            const String* andConnection) {
   Dictionary* entry = currentEntry(module);
   if (!entry || !andConnection) return nullptr;
-  auto* info = cast<Array>(entry->get(*andConnection));
-  if (!info) return nullptr;
-  return browserInfo(*info);
+  return Ref<Array>(cast<Array>(entry->get(*andConnection)));
+}
+
+Ref<MutableArray> QuarrinModuleCache::getInfoForPrinterModule(const URL* module,
+                                                              const String* andConnection) {
+  Ref<Array> info = recordedInfoForPrinterModule(module, andConnection);
+  return info ? browserInfo(*info) : nullptr;
 }
 
 void QuarrinModuleCache::addInfoForIOModule(const URL* module, const String* toConnection,

@@ -17,16 +17,18 @@ PMModule* PMHost::pmInterfaceForURL(const URL* url) const {
   return cast<PMModule>(loadedPlugins()->get(*url));
 }
 
-LookupInfoList* PMHost::GetLookupInfoList(const String& connectionType) {
-  LookupInfoList* list = nullptr;
+LookupInfoList* PMHost::listFor(const String& connectionType) const {
   for (const auto& item : *_lookupLists) {
     auto* candidate = cast<LookupInfoList>(item.get());
     if (candidate && candidate->connectionType() &&
-        candidate->connectionType()->isEqual(connectionType)) {
-      list = candidate;
-      break;
-    }
+        candidate->connectionType()->isEqual(connectionType))
+      return candidate;
   }
+  return nullptr;
+}
+
+LookupInfoList* PMHost::GetLookupInfoList(const String& connectionType) {
+  LookupInfoList* list = listFor(connectionType);
   if (!list) {
     auto created = make<LookupInfoList>(connectionType.copy());
     list = created.get();
@@ -56,6 +58,18 @@ LookupInfoList* PMHost::GetLookupInfoList(const String& connectionType) {
     }
   }
   return list;
+}
+
+void PMHost::recordLookupInfo(const String& connectionType) {
+  if (LookupInfoList* list = listFor(connectionType); list && list->maxIndex() != 0) return;
+  for (const auto& type : _recordedTypes)
+    if (type->isEqual(connectionType)) return;
+  bool filled = false;
+  for (const auto& key : loadedPlugins()->keys())
+    if (PMModule* module = pmInterfaceForURL(cast<URL>(key.get())))
+      filled = module->recordBrowserInfoForConnectionType(connectionType) || filled;
+  // As with a list: one that would stay empty asks every module again next time.
+  if (filled) _recordedTypes.push_back(connectionType.copy());
 }
 
 }  // namespace qr

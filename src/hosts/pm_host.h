@@ -2,6 +2,8 @@
 // module's browser info into a lookup list.
 #pragma once
 
+#include <vector>
+
 #include "hosts/host.h"
 #include "modules/lookup_source.h"
 #include "modules/pm_module.h"
@@ -17,11 +19,18 @@ class PMHost final : public QuarrinHost, public LookupListSource {
   // The list for the connection type, never null. A list that already holds
   // items is returned as it is; an empty one asks every module again.
   LookupInfoList* GetLookupInfoList(const String& connectionType) override;
+  // Has every module asked as GetLookupInfoList does, for a caller that wants
+  // only the answers in the cache: no list is built. A type already answered
+  // (by either call) is not asked again.
+  void recordLookupInfo(const String& connectionType);
   // The module registered under exactly that URL (a registry key), or null.
   PMModule* pmInterfaceForURL(const URL* url) const;
 
  private:
+  LookupInfoList* listFor(const String& connectionType) const;
+
   Ref<MutableArray> _lookupLists;
+  std::vector<Ref<String>> _recordedTypes;
 };
 
 }  // namespace qr

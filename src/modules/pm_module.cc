@@ -71,15 +71,31 @@ Ref<Array> PMModule::askPlugin(const String& connectionType) {
 }
 
 Ref<MutableArray> PMModule::createBrowserInfoForConnectionType(const String& connectionType) {
+  return cast<MutableArray>(browserInfo(connectionType, true));
+}
+
+bool PMModule::recordBrowserInfoForConnectionType(const String& connectionType) {
+  Ref<Array> answer = browserInfo(connectionType, false);
+  if (!answer) return false;
+  for (const auto& entry : *answer)
+    if (cast<Dictionary>(entry.get())) return true;
+  return false;
+}
+
+Ref<Array> PMModule::browserInfo(const String& connectionType, bool copied) {
   auto& cache = QuarrinModuleCache::defaultCache();
   const URL* url = pluginURL().get();
-  Ref<MutableArray> result;
+  auto recorded = [&](const String& type) -> Ref<Array> {
+    if (copied) return cache.getInfoForPrinterModule(url, &type);
+    return cache.recordedInfoForPrinterModule(url, &type);
+  };
+  Ref<Array> result;
   bool answered = false;
   if (lost()) return nullptr;
   if (!interfaceLoaded()) {
-    result = cache.getInfoForPrinterModule(url, &connectionType);
+    result = recorded(connectionType);
     if (isEmpty(result.get()) && connectionType.equals(kQuellnet))
-      result = cache.getInfoForPrinterModule(url, String::make(kDNSSD).get());
+      result = recorded(*String::make(kDNSSD));
     // Even an empty array is a recorded answer.
     answered = result != nullptr;
   }
@@ -96,10 +112,9 @@ Ref<MutableArray> PMModule::createBrowserInfoForConnectionType(const String& con
   if (!isEmpty(result.get()) || !isNetworkDiscovery(connectionType)) return result;
 
   // No network discovery answer of its own: lend the USB one, marked as borrowed.
-  result = createBrowserInfoForConnectionType(*String::make("USB"));
-  if (isEmpty(result.get()))
-    result = createBrowserInfoForConnectionType(*String::make("EPSON USB"));
-  if (!isEmpty(result.get())) {
+  result = browserInfo(*String::make("USB"), copied);
+  if (isEmpty(result.get())) result = browserInfo(*String::make("EPSON USB"), copied);
+  if (copied && !isEmpty(result.get())) {
     for (const auto& element : *result)
       if (auto* entry = cast<MutableDictionary>(element.get()))
         entry->set("USBParasite", String::make("True"));

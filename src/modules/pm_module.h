@@ -22,6 +22,10 @@ class PMModule final : public QuarrinModule {
   // The browser info for the connection type, or null; the entries are
   // mutable and belong to the caller alone.
   Ref<MutableArray> createBrowserInfoForConnectionType(const String& connectionType);
+  // Asks as the call above does, so that the cache ends up holding the answer,
+  // without copying what it already holds. Whether the answer has an entry
+  // that a lookup list would take (a dictionary).
+  bool recordBrowserInfoForConnectionType(const String& connectionType);
   // Icon image data for one browser-info entry, or null.
   Ref<Data> iconDataForConnectionType(const String& connectionType, const Dictionary& browserInfo);
 
@@ -29,6 +33,8 @@ class PMModule final : public QuarrinModule {
   // The plug-in's answer, asking the other network discovery type when one
   // gives nothing; null when it gives nothing or raises.
   Ref<Array> askPlugin(const String& connectionType);
+  // The answer; copied, fresh mutable copies, otherwise possibly the cache's own.
+  Ref<Array> browserInfo(const String& connectionType, bool copied);
   Ref<Array> askPluginOnce(const String& connectionType);
 };
 

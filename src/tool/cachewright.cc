@@ -45,11 +45,11 @@ void noteInstalled(const QuarrinHost& host, std::set<std::string>& urls) {
 }
 
 // Finds the installed modules and asks each what it offers; the answers land
-// in the cache, and the lookup lists built from them in lists. The hosts, and
-// with them every module, go when this returns. Gives the URLs of the modules
-// found. Each bundle is looked at once: its version cannot change between the
-// questions of one run.
-std::set<std::string> askModules(std::vector<Ref<LookupInfoList>>& lists) {
+// in the cache, and no lookup list is built, as nothing would read it. The
+// hosts, and with them every module, go when this returns. Gives the URLs of
+// the modules found. Each bundle is looked at once: its version cannot change
+// between the questions of one run.
+std::set<std::string> askModules() {
   BundleRunScope oncePerRun;
   auto pmHost = make<PMHost>();
   auto iomHost = make<IOMHost>();
@@ -58,8 +58,7 @@ std::set<std::string> askModules(std::vector<Ref<LookupInfoList>>& lists) {
   discoverModules(kMaxDiscoveryDepth, *pmHost, *iomHost, *pbmHost);
   for (const auto& item : *iomHost->connectionInfoList()) {
     auto* record = cast<ConnectionInfo>(item.get());
-    if (record && record->connectionType())
-      lists.emplace_back(pmHost->GetLookupInfoList(*record->connectionType()));
+    if (record && record->connectionType()) pmHost->recordLookupInfo(*record->connectionType());
   }
   std::set<std::string> installed;
   for (const QuarrinHost* host :
@@ -78,7 +77,7 @@ bool writeCacheFile(const char* path) {
 
 }  // namespace
 
-int runCachewright(int argc, char** argv, bool isolatePlugins, bool processEnds) {
+int runCachewright(int argc, char** argv, bool isolatePlugins) {
   bool streamMode = false;
   for (int opt; (opt = getopt(argc, argv, "s?")) != -1;) {
     if (opt != 's') {
@@ -98,15 +97,8 @@ int runCachewright(int argc, char** argv, bool isolatePlugins, bool processEnds)
   if (isolatePlugins) PluginRunner::install(std::make_unique<ScannerClient>(scannerProgramPath()));
   if (isPathMode(argc, argv)) FailureMemory::shared().setConsulted(false);
   BundleStamps::shared().consult();
-  std::vector<Ref<LookupInfoList>> lists;
-  std::set<std::string> installed = askModules(lists);
+  std::set<std::string> installed = askModules();
   PluginRunner::install(nullptr);
-  // The lists hold a copy of every answer and no module: a process about to
-  // end leaves them to the exit instead of freeing them one by one.
-  if (processEnds) {
-    static auto* const leftToExit = new std::vector<Ref<LookupInfoList>>;
-    leftToExit->swap(lists);
-  }
   FailureMemory::shared().keepOnly(installed);
   FailureMemory::shared().save();
   // Stream mode leaves the store to the failure record alone.

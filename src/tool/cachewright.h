@@ -8,8 +8,7 @@ namespace qr {
 extern const char kCachewrightUsage[];
 
 // Plug-in code runs in the helper process unless isolatePlugins is false,
-// which only a benchmark comparing the two should ask for. processEnds says
-// the process exits right after, so what only needs freeing may be left.
-int runCachewright(int argc, char** argv, bool isolatePlugins = true, bool processEnds = false);
+// which only a benchmark comparing the two should ask for.
+int runCachewright(int argc, char** argv, bool isolatePlugins = true);
 
 }  // namespace qr

@@ -3,5 +3,5 @@
 
 int main(int argc, char** argv) {
   qr::tuneHeapForShortRun();
-  return qr::runCachewright(argc, argv, true, true);
+  return qr::runCachewright(argc, argv);
 }

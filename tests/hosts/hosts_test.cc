@@ -115,6 +115,39 @@ TEST_F(Hosts, ALookupListHoldsEveryModulesEntriesAndIsFilledAgainOnlyWhileEmpty)
   }
 }
 
+TEST_F(Hosts, RecordingAsksAsAListWouldAndLeavesTheSameCache) {
+  const char* const fixtures[] = {"c_pm", "pm_serial", "pm_usb_only"};
+  const char* const types[] = {"USB", "Serial", "FireWire", "DNSSD", "USB"};
+  auto asked = [&](size_t from) {
+    std::vector<std::string> out;
+    for (const char* fixture : fixtures)
+      for (const auto& call : calls_.of(fixture, from)) out.push_back(fixture + (" " + call));
+    return out;
+  };
+  Ref<Dictionary> filled[2];
+  std::vector<std::string> calls[2];
+  for (int recording = 0; recording < 2; ++recording) {
+    cache().setCacheDict(make<MutableDictionary>());
+    size_t from = calls_.lines().size();
+    auto host = hostOf<PMHost>({"c_pm", "c_iom", "pm_serial", "pm_usb_only"});
+    for (const char* type : types)
+      recording ? host->recordLookupInfo(*String::make(type))
+                : void(host->GetLookupInfoList(*String::make(type)));
+    filled[recording] = cache().cacheDictionary();
+    calls[recording] = asked(from);
+  }
+  EXPECT_TRUE(filled[1]->isEqual(*filled[0])) << describe(filled[1].get());
+  EXPECT_EQ(calls[1], calls[0]);
+  EXPECT_GT(filled[1]->count(), 0u);
+
+  // Modules not yet loaded take the recorded answers and call nothing.
+  size_t from = calls_.lines().size();
+  auto host = hostOf<PMHost>({"c_pm", "pm_serial", "pm_usb_only"});
+  for (const char* type : types) host->recordLookupInfo(*String::make(type));
+  EXPECT_EQ(asked(from), std::vector<std::string>{});
+  EXPECT_TRUE(cache().cacheDictionary()->isEqual(*filled[0]));
+}
+
 // A record whose browser is the fixture of that name, or the path given.
 Ref<ConnectionInfo> record(const std::string& browser, const char* type = "USB") {
   bool fixture = browser.find_first_of("/.") == std::string::npos;
