@@ -45,7 +45,9 @@ bool ValueBuilder::endContainer() {
 Ref<Object> ValueBuilder::leafValue(std::string_view text) {
   switch (leaf_) {
     case Tag::Key:
-      if (auto shared = strings_.intern(text)) return shared;
+      // Long keys (paths, URLs) name one entry each and are rarely repeated.
+      if (text.size() <= kShortKey)
+        if (auto shared = strings_.intern(text)) return shared;
       return qr::String::fromUTF8(text);
     case Tag::String:
       if (mutableLeaves_) {

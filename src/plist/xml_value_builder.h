@@ -147,8 +147,10 @@ class ValueBuilder {
   // Where a closing dictionary's pairs are gathered, kept for the next one.
   std::vector<std::pair<Ref<Object>, Ref<Object>>> pairs_;
   Ref<Object> root_;
-  // Every key, and short immutable string values, are shared within the parse.
+  // Keys and immutable string values up to these lengths are shared within
+  // the parse.
   static constexpr size_t kShortString = 32;
+  static constexpr size_t kShortKey = 48;
   static constexpr size_t kMaxShared = size_t(1) << 18;
   StringTable strings_{kMaxShared};
 };
