@@ -72,7 +72,7 @@ void exerciseKey(const String& whole) {
   check(!shortcut || *shortcut == *literal);
   Ref<String> found = stringForKey(*text, *key);
   check((found.get() != nullptr) == shortcut.has_value());
-  auto list = qr::make<qr::Array>(std::vector<Ref<qr::Object>>{key, String::make("MFG:")});
+  auto list = qr::Array::build(std::vector<Ref<qr::Object>>{key, String::make("MFG:")});
   searchStringFor(*text, *list);
   dictionaryValueForKeySeperator(*text, *key->substring(0, 1), *key->substring(1, 2));
   auto long1 = dictionaryValueForKeySeperator(*text, *key, *String::make(";"));

@@ -58,7 +58,7 @@ Ref<Array> PlugIn::factoriesForType(const UUID& typeID) const {
         factories.emplace_back(std::move(factory));
     }
   }
-  return make<Array>(std::move(factories));
+  return Array::build(std::move(factories));
 }
 
 void* PlugIn::loadImage() {

@@ -221,17 +221,24 @@ class BinaryReader {
     bool mutableContainers = mutability_ != Mutability::Immutable;
     if (h.type == kArray) {
       if (!bodyFits(h, trailer_.refSize)) return nullptr;
-      std::vector<Ref<Object>> items;
-      items.reserve(h.count);
+      // Gathered on a stack shared by every level, as the pairs below are.
+      size_t base = items_.size();
       for (uint64_t i = 0; i < h.count; ++i) {
         uint64_t r = reference(h, i);
         if (r >= trailer_.objectCount) return nullptr;
         auto v = child(r, depth + 1);
         if (!v) return nullptr;
-        items.push_back(std::move(v));
+        items_.push_back(std::move(v));
       }
-      if (mutableContainers) return make<MutableArray>(std::move(items));
-      return make<Array>(std::move(items));
+      auto items = std::span(items_).subspan(base);
+      Ref<Object> a;
+      if (mutableContainers)
+        a = make<MutableArray>(std::vector<Ref<Object>>(std::make_move_iterator(items.begin()),
+                                                        std::make_move_iterator(items.end())));
+      else
+        a = Array::build(items);
+      items_.resize(base);
+      return a;
     }
     if (!bodyFits(h, 2 * trailer_.refSize)) return nullptr;
     // The pairs go on a stack shared by every level; a nested container takes
@@ -349,6 +356,7 @@ class BinaryReader {
   Mutability mutability_;
   std::vector<Slot> slots_;
   std::vector<std::pair<Ref<Object>, Ref<Object>>> pairs_;
+  std::vector<Ref<Object>> items_;
   uint64_t nodeBudget_;
   uint64_t payloadBudget_;
   uint64_t nodes_ = 0;

@@ -224,7 +224,7 @@ class TextParser {
       }
     }
     if (mutableContainers_) return make<MutableArray>(std::move(items));
-    return make<Array>(std::move(items));
+    return Array::build(std::move(items));
   }
 
   // key = value; entries up to "}" (or, for a strings table, to the end of

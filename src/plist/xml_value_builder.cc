@@ -80,11 +80,15 @@ Ref<Object> ValueBuilder::leafValue(std::string_view text) {
 }
 
 Ref<Object> ValueBuilder::closeArray(size_t start) {
-  std::vector<Ref<Object>> items(std::make_move_iterator(values_.begin() + ptrdiff_t(start)),
-                                 std::make_move_iterator(values_.end()));
+  auto items = std::span(values_).subspan(start);
+  Ref<Object> a;
+  if (mutableContainers_)
+    a = qr::make<MutableArray>(std::vector<Ref<Object>>(std::make_move_iterator(items.begin()),
+                                                        std::make_move_iterator(items.end())));
+  else
+    a = qr::Array::build(items);
   values_.resize(start);
-  if (mutableContainers_) return qr::make<MutableArray>(std::move(items));
-  return qr::make<qr::Array>(std::move(items));
+  return a;
 }
 
 Ref<Object> ValueBuilder::closeDictionary(size_t start) {

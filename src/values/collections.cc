@@ -1,4 +1,6 @@
 #include <algorithm>
+#include <memory>
+#include <new>
 #include <stdexcept>
 
 #include "values/array.h"
@@ -7,22 +9,53 @@
 
 namespace qr {
 
-Ref<Array> Array::copy() const { return qr::make<Array>(items_); }
-Ref<MutableArray> Array::mutableCopy() const { return qr::make<MutableArray>(items_); }
+Array::~Array() {
+  if (ownsBlock_) std::destroy_n(items_, count_);
+}
+
+void Array::dispose() const noexcept {
+  if (!ownsBlock_) {
+    delete this;
+    return;
+  }
+  void* block = const_cast<Array*>(this);
+  this->~Array();
+  ::operator delete(block);
+}
+
+Ref<Array> Array::build(std::vector<Ref<Object>> items) { return build(std::span(items)); }
+
+Ref<Array> Array::build(std::span<Ref<Object>> items) {
+  static_assert(sizeof(Array) % alignof(Ref<Object>) == 0);
+  void* block = ::operator new(sizeof(Array) + items.size() * sizeof(Ref<Object>));
+  auto a = Ref<Array>::adopt(new (block) Array());
+  a->ownsBlock_ = true;
+  a->items_ = reinterpret_cast<Ref<Object>*>(static_cast<char*>(block) + sizeof(Array));
+  for (auto& item : items) new (a->items_ + a->count_++) Ref<Object>(std::move(item));
+  return a;
+}
+
+Ref<Array> Array::copy() const {
+  std::vector<Ref<Object>> items(begin(), end());
+  return build(std::span(items));
+}
+Ref<MutableArray> Array::mutableCopy() const {
+  return qr::make<MutableArray>(std::vector<Ref<Object>>(begin(), end()));
+}
 
 bool Array::isEqual(const Object& other) const noexcept {
   if (this == &other) return true;
   if (other.kind() != TypeKind::Array) return false;
   const auto& o = static_cast<const Array&>(other);
-  if (items_.size() != o.items_.size()) return false;
-  for (size_t i = 0; i < items_.size(); ++i)
+  if (count_ != o.count_) return false;
+  for (size_t i = 0; i < count_; ++i)
     if (!equal(items_[i], o.items_[i])) return false;
   return true;
 }
 
 std::string Array::description() const {
   std::string out = "(";
-  for (size_t i = 0; i < items_.size(); ++i) {
+  for (size_t i = 0; i < count_; ++i) {
     if (i) out += ", ";
     out += describe(items_[i].get());
   }
@@ -30,18 +63,20 @@ std::string Array::description() const {
 }
 
 void MutableArray::insert(size_t index, Ref<Object> value) {
-  if (index > items_.size()) throw std::out_of_range("array index");
-  items_.insert(items_.begin() + static_cast<ptrdiff_t>(index), std::move(value));
+  if (index > store_.size()) throw std::out_of_range("array index");
+  store_.insert(store_.begin() + static_cast<ptrdiff_t>(index), std::move(value));
+  sync();
 }
 
 void MutableArray::set(size_t index, Ref<Object> value) {
-  if (index >= items_.size()) throw std::out_of_range("array index");
-  items_[index] = std::move(value);
+  if (index >= store_.size()) throw std::out_of_range("array index");
+  store_[index] = std::move(value);
 }
 
 void MutableArray::removeAt(size_t index) {
-  if (index >= items_.size()) throw std::out_of_range("array index");
-  items_.erase(items_.begin() + static_cast<ptrdiff_t>(index));
+  if (index >= store_.size()) throw std::out_of_range("array index");
+  store_.erase(store_.begin() + static_cast<ptrdiff_t>(index));
+  sync();
 }
 
 namespace {
@@ -55,31 +90,86 @@ size_t keyHash(std::string_view key) {
   if (!decodeUTF8(key, units)) return 0;
   return hashCodeUnits(std::u16string_view(units));
 }
+
+// Twice the live entries at least, so that a probe soon meets an empty slot.
+size_t indexSizeFor(size_t live) {
+  size_t size = 16;
+  while (size < live * 2) size *= 2;
+  return size;
+}
+
+void placeInIndex(uint32_t* index, size_t size, size_t hash, size_t position) {
+  size_t mask = size - 1;
+  size_t slot = hash & mask;
+  while (index[slot] != 0 && index[slot] != kTombstone) slot = (slot + 1) & mask;
+  index[slot] = static_cast<uint32_t>(position + 1);
+}
+
+void checkPair(const Ref<Object>& key, const Ref<Object>& value) {
+  if (!key || !value) throw std::invalid_argument("dictionary key and value must not be null");
+}
 }  // namespace
 
-Dictionary::~Dictionary() = default;
+Dictionary::~Dictionary() {
+  if (ownsBlock_) std::destroy_n(entries_, slots_);
+}
+
+void Dictionary::dispose() const noexcept {
+  if (!ownsBlock_) {
+    delete this;
+    return;
+  }
+  void* block = const_cast<Dictionary*>(this);
+  this->~Dictionary();
+  ::operator delete(block);
+}
 
 Ref<Dictionary> Dictionary::build(std::vector<std::pair<Ref<Object>, Ref<Object>>> pairs) {
   return build(std::span(pairs));
 }
 
 Ref<Dictionary> Dictionary::build(std::span<std::pair<Ref<Object>, Ref<Object>>> pairs) {
-  auto d = Ref<Dictionary>::adopt(new Dictionary());
-  d->entries_.reserve(pairs.size());
-  for (auto& [k, v] : pairs) d->setValue(std::move(k), std::move(v));
+  size_t n = pairs.size();
+  if (n >= UINT32_MAX - 1) throw std::length_error("dictionary too large");
+  // Sized for every pair: repeated keys, which leave some room unused, are rare.
+  size_t indexSize = n > kLinearLimit ? indexSizeFor(n) : 0;
+  static_assert(sizeof(Dictionary) % alignof(Entry) == 0 && alignof(Entry) >= alignof(uint32_t));
+  void* block =
+      ::operator new(sizeof(Dictionary) + n * sizeof(Entry) + indexSize * sizeof(uint32_t));
+  // Adopted at once: a pair that throws below frees what was placed so far.
+  auto d = Ref<Dictionary>::adopt(new (block) Dictionary());
+  d->ownsBlock_ = true;
+  d->entries_ = reinterpret_cast<Entry*>(static_cast<char*>(block) + sizeof(Dictionary));
+  if (indexSize) {
+    d->index_ = reinterpret_cast<uint32_t*>(d->entries_ + n);
+    std::fill_n(d->index_, indexSize, 0u);
+    d->indexSize_ = static_cast<uint32_t>(indexSize);
+  }
+  for (auto& pair : pairs) {
+    Ref<Object>& key = pair.first;
+    Ref<Object>& value = pair.second;
+    checkPair(key, value);
+    size_t h = key->hash();
+    size_t i = d->find(h, [&](const Object& k) { return k.isEqual(*key); });
+    if (i != SIZE_MAX) {
+      d->entries_[i].value = std::move(value);
+      continue;
+    }
+    new (d->entries_ + d->slots_) Entry{std::move(key), std::move(value), h};
+    if (indexSize) placeInIndex(d->index_, indexSize, h, d->slots_);
+    ++d->slots_;
+    ++d->live_;
+  }
   return d;
 }
 
 Ref<Dictionary> Dictionary::copy() const {
-  auto d = Ref<Dictionary>::adopt(new Dictionary());
-  d->entries_.reserve(live_);
+  std::vector<std::pair<Ref<Object>, Ref<Object>>> pairs;
+  pairs.reserve(live_);
   forEach([&](const Object& k, const Object& v) {
-    d->entries_.push_back(
-        {Ref<Object>(const_cast<Object*>(&k)), Ref<Object>(const_cast<Object*>(&v)), k.hash()});
+    pairs.emplace_back(const_cast<Object*>(&k), const_cast<Object*>(&v));
   });
-  d->live_ = d->entries_.size();
-  d->rebuildIndex();
-  return d;
+  return build(std::span(pairs));
 }
 
 Ref<MutableDictionary> Dictionary::mutableCopy() const {
@@ -93,14 +183,14 @@ Ref<MutableDictionary> Dictionary::mutableCopy() const {
 
 template <class Match>
 size_t Dictionary::find(size_t hash, Match&& match) const noexcept {
-  if (index_.empty()) {
-    for (size_t i = 0; i < entries_.size(); ++i) {
+  if (indexSize_ == 0) {
+    for (size_t i = 0; i < slots_; ++i) {
       const Entry& e = entries_[i];
       if (e.key && e.hash == hash && match(*e.key)) return i;
     }
     return SIZE_MAX;
   }
-  size_t mask = index_.size() - 1;
+  size_t mask = indexSize_ - 1;
   for (size_t slot = hash & mask;; slot = (slot + 1) & mask) {
     uint32_t v = index_[slot];
     if (v == 0) return SIZE_MAX;
@@ -122,9 +212,9 @@ size_t Dictionary::findText(std::string_view key) const noexcept {
     if (s.isNarrow()) return s.narrow() == key;
     return s.utf8() == key;
   };
-  if (index_.empty()) {
+  if (indexSize_ == 0) {
     // A short list is searched by the text alone: hashing it would cost more.
-    for (size_t i = 0; i < entries_.size(); ++i)
+    for (size_t i = 0; i < slots_; ++i)
       if (entries_[i].key && matches(*entries_[i].key)) return i;
     return SIZE_MAX;
   }
@@ -139,85 +229,9 @@ Object* Dictionary::get(std::string_view key) const noexcept {
 std::vector<Ref<Object>> Dictionary::keys() const {
   std::vector<Ref<Object>> out;
   out.reserve(live_);
-  for (const Entry& e : entries_)
+  for (const Entry& e : entries())
     if (e.key) out.push_back(e.key);
   return out;
-}
-
-void Dictionary::rebuildIndex() {
-  index_.clear();
-  if (live_ <= kLinearLimit) return;
-  size_t size = 16;
-  while (size < live_ * 2) size *= 2;
-  index_.assign(size, 0);
-  size_t mask = size - 1;
-  for (size_t i = 0; i < entries_.size(); ++i) {
-    if (!entries_[i].key) continue;
-    size_t slot = entries_[i].hash & mask;
-    while (index_[slot] != 0) slot = (slot + 1) & mask;
-    index_[slot] = static_cast<uint32_t>(i + 1);
-  }
-}
-
-void Dictionary::compact() {
-  std::erase_if(entries_, [](const Entry& e) { return !e.key; });
-  rebuildIndex();
-}
-
-void Dictionary::setValue(Ref<Object> key, Ref<Object> value) {
-  if (!key || !value) throw std::invalid_argument("dictionary key and value must not be null");
-  size_t h = key->hash();
-  size_t i = find(h, [&](const Object& k) { return k.isEqual(*key); });
-  if (i != SIZE_MAX) {
-    entries_[i].value = std::move(value);
-    return;
-  }
-  if (entries_.size() >= UINT32_MAX - 1) throw std::length_error("dictionary too large");
-  entries_.push_back({std::move(key), std::move(value), h});
-  ++live_;
-  if (index_.empty()) {
-    if (live_ > kLinearLimit) rebuildIndex();
-    return;
-  }
-  // Keep the load (live entries and tombstones) under one half.
-  if (entries_.size() * 2 > index_.size()) {
-    if (entries_.size() > live_ * 2)
-      compact();
-    else
-      rebuildIndex();
-    return;
-  }
-  size_t mask = index_.size() - 1;
-  size_t slot = h & mask;
-  while (index_[slot] != 0 && index_[slot] != kTombstone) slot = (slot + 1) & mask;
-  index_[slot] = static_cast<uint32_t>(entries_.size());
-}
-
-bool Dictionary::removeValue(const Object& key) {
-  return removeAt(find(key.hash(), [&](const Object& k) { return k.isEqual(key); }));
-}
-
-bool Dictionary::removeText(std::string_view key) { return removeAt(findText(key)); }
-
-bool Dictionary::removeAt(size_t i) {
-  if (i == SIZE_MAX) return false;
-  if (!index_.empty()) {
-    size_t mask = index_.size() - 1;
-    size_t slot = entries_[i].hash & mask;
-    while (index_[slot] != i + 1) slot = (slot + 1) & mask;
-    index_[slot] = kTombstone;
-  }
-  entries_[i].key.reset();
-  entries_[i].value.reset();
-  --live_;
-  if (index_.empty() || entries_.size() > live_ * 2 + kLinearLimit) compact();
-  return true;
-}
-
-void Dictionary::clear() noexcept {
-  entries_.clear();
-  index_.clear();
-  live_ = 0;
 }
 
 bool Dictionary::isEqual(const Object& other) const noexcept {
@@ -225,7 +239,7 @@ bool Dictionary::isEqual(const Object& other) const noexcept {
   if (other.kind() != TypeKind::Dictionary) return false;
   const auto& o = static_cast<const Dictionary&>(other);
   if (live_ != o.live_) return false;
-  for (const Entry& e : entries_) {
+  for (const Entry& e : entries()) {
     if (!e.key) continue;
     if (!equal(e.value.get(), o.get(*e.key))) return false;
   }
@@ -243,10 +257,85 @@ std::string Dictionary::description() const {
   return out + "}";
 }
 
+void MutableDictionary::sync() noexcept {
+  entries_ = store_.data();
+  slots_ = static_cast<uint32_t>(store_.size());
+  index_ = indexStore_.data();
+  indexSize_ = static_cast<uint32_t>(indexStore_.size());
+}
+
+void MutableDictionary::rebuildIndex() {
+  indexStore_.clear();
+  if (live_ > kLinearLimit) {
+    indexStore_.assign(indexSizeFor(live_), 0);
+    for (size_t i = 0; i < store_.size(); ++i)
+      if (store_[i].key) placeInIndex(indexStore_.data(), indexStore_.size(), store_[i].hash, i);
+  }
+  sync();
+}
+
+void MutableDictionary::compact() {
+  std::erase_if(store_, [](const Entry& e) { return !e.key; });
+  rebuildIndex();
+}
+
+void MutableDictionary::set(Ref<Object> key, Ref<Object> value) {
+  checkPair(key, value);
+  size_t h = key->hash();
+  size_t i = find(h, [&](const Object& k) { return k.isEqual(*key); });
+  if (i != SIZE_MAX) {
+    store_[i].value = std::move(value);
+    return;
+  }
+  if (store_.size() >= UINT32_MAX - 1) throw std::length_error("dictionary too large");
+  store_.push_back({std::move(key), std::move(value), h});
+  ++live_;
+  sync();
+  if (indexStore_.empty()) {
+    if (live_ > kLinearLimit) rebuildIndex();
+    return;
+  }
+  // Keep the load (live entries and tombstones) under one half.
+  if (store_.size() * 2 > indexStore_.size()) {
+    if (store_.size() > live_ * 2)
+      compact();
+    else
+      rebuildIndex();
+    return;
+  }
+  placeInIndex(indexStore_.data(), indexStore_.size(), h, store_.size() - 1);
+}
+
 void MutableDictionary::set(std::string_view key, Ref<Object> value) {
   set(Ref<Object>(String::make(key)), std::move(value));
 }
 
-bool MutableDictionary::remove(std::string_view key) { return removeText(key); }
+bool MutableDictionary::remove(const Object& key) {
+  return removeAt(find(key.hash(), [&](const Object& k) { return k.isEqual(key); }));
+}
+
+bool MutableDictionary::remove(std::string_view key) { return removeAt(findText(key)); }
+
+bool MutableDictionary::removeAt(size_t i) {
+  if (i == SIZE_MAX) return false;
+  if (!indexStore_.empty()) {
+    size_t mask = indexStore_.size() - 1;
+    size_t slot = store_[i].hash & mask;
+    while (indexStore_[slot] != i + 1) slot = (slot + 1) & mask;
+    indexStore_[slot] = kTombstone;
+  }
+  store_[i].key.reset();
+  store_[i].value.reset();
+  --live_;
+  if (indexStore_.empty() || store_.size() > live_ * 2 + kLinearLimit) compact();
+  return true;
+}
+
+void MutableDictionary::removeAll() noexcept {
+  store_.clear();
+  indexStore_.clear();
+  live_ = 0;
+  sync();
+}
 
 }  // namespace qr

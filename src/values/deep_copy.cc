@@ -65,7 +65,7 @@ Ref<Object> copy(const Object& v, Mutability m, size_t depth) {
         items.push_back(std::move(c));
       }
       if (mutableContainers) return qr::make<MutableArray>(std::move(items));
-      return qr::make<Array>(std::move(items));
+      return Array::build(std::move(items));
     }
     case TypeKind::Dictionary: {
       const auto& d = static_cast<const Dictionary&>(v);

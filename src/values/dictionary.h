@@ -28,7 +28,7 @@ class Dictionary : public Object {
   ~Dictionary() override;
 
   // An immutable dictionary of the pairs in order; a repeated key keeps its
-  // first position and its last value.
+  // first position and its last value. Its entries share one allocation with it.
   static Ref<Dictionary> build(std::vector<std::pair<Ref<Object>, Ref<Object>>> pairs);
   // The same, moving the pairs out of a buffer the caller keeps using.
   static Ref<Dictionary> build(std::span<std::pair<Ref<Object>, Ref<Object>>> pairs);
@@ -51,7 +51,7 @@ class Dictionary : public Object {
   // Calls f(key, value) for every entry in insertion order.
   template <class F>
   void forEach(F&& f) const {
-    for (const Entry& e : entries_)
+    for (const Entry& e : entries())
       if (e.key) f(*e.key, *e.value);
   }
   std::vector<Ref<Object>> keys() const;
@@ -62,36 +62,47 @@ class Dictionary : public Object {
   std::string description() const override;
 
  protected:
-  void setValue(Ref<Object> key, Ref<Object> value);
-  bool removeValue(const Object& key);
-  bool removeText(std::string_view key);
-  void clear() noexcept;
-  void reserveEntries(size_t n) { entries_.reserve(n); }
-
- private:
+  std::span<const Entry> entries() const noexcept { return {entries_, slots_}; }
   template <class Match>
   size_t find(size_t hash, Match&& match) const noexcept;
   // The position of the entry whose key is a string of this text, or SIZE_MAX.
   size_t findText(std::string_view key) const noexcept;
-  bool removeAt(size_t position);
-  void rebuildIndex();
-  void compact();
 
-  std::vector<Entry> entries_;
-  std::vector<uint32_t> index_;  // entry position + 1; 0 empty; kTombstone removed
-  size_t live_ = 0;
+  // What the lookups read: the block after an immutable dictionary, or the
+  // storage of a mutable one, which points here again after every change.
+  Entry* entries_ = nullptr;
+  uint32_t slots_ = 0;  // entries in use, removed ones included
+  uint32_t live_ = 0;
+  uint32_t* index_ = nullptr;  // entry position + 1; 0 empty; kTombstone removed
+  uint32_t indexSize_ = 0;     // a power of two, or 0 for a short list searched in order
+
+ private:
+  void dispose() const noexcept override;
+  bool ownsBlock_ = false;
 };
 
 class MutableDictionary final : public Dictionary {
  public:
   MutableDictionary() = default;
   // Replaces the value of an equal key in place, keeping its position.
-  void set(Ref<Object> key, Ref<Object> value) { setValue(std::move(key), std::move(value)); }
+  void set(Ref<Object> key, Ref<Object> value);
   void set(std::string_view key, Ref<Object> value);
-  bool remove(const Object& key) { return removeValue(key); }
+  bool remove(const Object& key);
   bool remove(std::string_view key);
-  void removeAll() noexcept { clear(); }
-  void reserve(size_t n) { reserveEntries(n); }
+  void removeAll() noexcept;
+  void reserve(size_t n) {
+    store_.reserve(n);
+    sync();
+  }
+
+ private:
+  bool removeAt(size_t position);
+  void rebuildIndex();
+  void compact();
+  void sync() noexcept;
+
+  std::vector<Entry> store_;
+  std::vector<uint32_t> indexStore_;
 };
 
 template <>

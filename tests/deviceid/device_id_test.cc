@@ -113,7 +113,7 @@ TEST(KeySearch, StringForKeyAndSearchStringFor) {
     for (const auto& t : {S(text), wide(text)})
       for (const auto& k : {S(key), wide(key)})
         EXPECT_EQ(show(stringForKey(*t, *k)), expected) << text << " by " << key;
-  auto list = [](std::vector<qr::Ref<qr::Object>> items) { return qr::make<qr::Array>(items); };
+  auto list = [](std::vector<qr::Ref<qr::Object>> items) { return qr::Array::build(items); };
   // The component decides before the key order; keys that are not strings are passed over.
   EXPECT_EQ(show(searchStringFor(*S("a:1;b:2"), *list({list({}), S("b:"), S("a:")}))), "1");
   EXPECT_EQ(show(searchStringFor(*S("a:1"), *list({}))), nullopt);

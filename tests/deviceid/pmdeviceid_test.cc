@@ -23,17 +23,16 @@ TEST(PMDeviceID, JSONValues) {
   auto d = qr::make<qr::MutableDictionary>();
   d->set("q\"b\\n\n\r\t\b\f\x1F ", qr::Number::real(0.1));
   d->set(qr::Number::integer(3), qr::Number::unsignedInteger(UINT64_MAX));
-  qr::Ref<qr::Object> deep = qr::make<qr::Array>(std::vector<qr::Ref<qr::Object>>{
+  qr::Ref<qr::Object> deep = qr::Array::build(std::vector<qr::Ref<qr::Object>>{
       d, qr::Number::real(NAN), qr::String::fromUTF16(u"\xDC00"), qr::Data::copy("a"),
       qr::Data::copy("ab"), qr::Data::copy("abc")});
   EXPECT_EQ(
       json(deep),
       R"j([{"q\"b\\n\n\r\t\b\f\u001f ":0.1,"3":18446744073709551615},"nan","�","YQ==","YWI=","YWJj"])j");
   // Nesting beyond the property-list bound prints as null.
-  for (size_t i = 1; i < qr::kMaxPropertyListDepth; ++i)
-    deep = qr::make<qr::Array>(std::vector{deep});
+  for (size_t i = 1; i < qr::kMaxPropertyListDepth; ++i) deep = qr::Array::build(std::vector{deep});
   EXPECT_NE(json(deep).find("YWJj"), std::string::npos);
-  EXPECT_EQ(json(qr::make<qr::Array>(std::vector{deep})).find("YWJj"), std::string::npos);
+  EXPECT_EQ(json(qr::Array::build(std::vector{deep})).find("YWJj"), std::string::npos);
 }
 
 TEST(PMDeviceID, InvocationsGiveTheirOutputAndStatus) {

@@ -52,7 +52,7 @@ inline Ref<Object> S(std::string_view utf8) { return String::make(utf8); }
 inline Ref<Object> I(int64_t v) { return Number::integer(v); }
 inline Ref<Object> R(double v) { return Number::real(v); }
 inline Ref<Object> B(std::string_view bytes) { return Data::copy(bytes); }
-inline Ref<Object> A(std::vector<Ref<Object>> items) { return make<Array>(std::move(items)); }
+inline Ref<Object> A(std::vector<Ref<Object>> items) { return Array::build(std::move(items)); }
 inline Ref<Object> D(std::vector<std::pair<std::string, Ref<Object>>> entries) {
   std::vector<std::pair<Ref<Object>, Ref<Object>>> pairs;
   for (auto& [k, v] : entries) pairs.emplace_back(S(k), v);

@@ -5,6 +5,7 @@
 
 #include <unistd.h>
 
+#include <algorithm>
 #include <cstdlib>
 #include <functional>
 
@@ -89,6 +90,52 @@ TEST(Dictionary, TextLookupFindsKeysOfEveryStorage) {
   for (const char* text : {"USB", "Caf\xC3\xA9 \xE2\x82\xAC", "Kind"})
     EXPECT_TRUE(d->get(text)) << text;
   EXPECT_FALSE(d->get("Caf\xC3\xA9"));
+}
+
+// Random sets and removals against a model, across the sizes where the index
+// comes and goes; after each step the immutable forms built from the same
+// pairs (with repeats) and copied must agree with it, in order.
+TEST(Dictionary, EveryFormAgreesWithAModelThroughSetsAndRemovals) {
+  std::srand(7);
+  auto d = make<MutableDictionary>();
+  std::vector<std::pair<std::string, int>> model;  // insertion order
+  std::vector<std::pair<Ref<Object>, Ref<Object>>> history;
+  for (int step = 0; step < 3000; ++step) {
+    std::string key = "k" + std::to_string(std::rand() % (step < 1500 ? 40 : 12));
+    auto at = std::find_if(model.begin(), model.end(), [&](auto& e) { return e.first == key; });
+    if (std::rand() % 3 == 0) {
+      EXPECT_EQ(std::rand() % 2 ? d->remove(key) : d->remove(*S(key)), at != model.end());
+      if (at != model.end()) model.erase(at);
+      history.clear();
+      for (auto& [k, v] : model) history.emplace_back(S(k), I(v));
+    } else {
+      d->set(S(key), I(step));
+      if (at != model.end())
+        at->second = step;
+      else
+        model.emplace_back(key, step);
+      history.emplace_back(S(key), I(step));
+    }
+    auto pairs = history;
+    Ref<Dictionary> forms[] = {d, Dictionary::build(std::move(pairs)), d->copy(), d->mutableCopy()};
+    for (const auto& form : forms) {
+      ASSERT_EQ(form->count(), model.size()) << step;
+      std::vector<std::pair<std::string, int>> seen;
+      form->forEach([&](const Object& k, const Object& v) {
+        seen.emplace_back(static_cast<const String&>(k).utf8(),
+                          int(static_cast<const Number&>(v).int64Value()));
+      });
+      ASSERT_EQ(seen, model) << step;
+      for (int k = 0; k < 42; k += 5) {
+        std::string text = "k" + std::to_string(k);
+        auto in =
+            std::find_if(model.begin(), model.end(), [&](auto& e) { return e.first == text; });
+        ASSERT_EQ(form->get(text) != nullptr, in != model.end()) << step << text;
+        ASSERT_EQ(form->get(*S(text)), form->get(text));
+      }
+      ASSERT_TRUE(form->isEqual(*forms[0]));
+    }
+  }
 }
 
 TEST(UUID, ParsesEitherCaseAndRefusesAnythingElse) {
