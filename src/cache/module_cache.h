@@ -31,8 +31,8 @@ class QuarrinModuleCache final : public Object {
   // handed out as fresh mutable copies without "Printer Browser Icons".
   void addInfo(const Array* info, const URL* forPrinterModule, const String* andConnection);
   Ref<MutableArray> getInfoForPrinterModule(const URL* module, const String* andConnection);
-  // The same answer as the cache holds it, not copied: only to look at, and
-  // only until the cache next changes. A stale entry goes, as above.
+  // The same answer as the cache holds it, not copied: only to look at, as
+  // the cache may replace it later. A stale entry goes, as above.
   Ref<Array> recordedInfoForPrinterModule(const URL* module, const String* andConnection);
 
   // I/O module answers: connection type and printer browser module path.

@@ -20,8 +20,8 @@ class PMHost final : public QuarrinHost, public LookupListSource {
   // items is returned as it is; an empty one asks every module again.
   LookupInfoList* GetLookupInfoList(const String& connectionType) override;
   // Has every module asked as GetLookupInfoList does, for a caller that wants
-  // only the answers in the cache: no list is built. A type already answered
-  // (by either call) is not asked again.
+  // only the answers in the cache: no list is built. As there, a type whose
+  // list or earlier recording holds an entry is not asked again.
   void recordLookupInfo(const String& connectionType);
   // The module registered under exactly that URL (a registry key), or null.
   PMModule* pmInterfaceForURL(const URL* url) const;

@@ -6,7 +6,9 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <memory>
 #include <optional>
+#include <string_view>
 #include <utility>
 
 namespace qr {
@@ -40,7 +42,7 @@ class Walk {
       close(fd);
       return;
     }
-    DIR* dir = fdopendir(fd);
+    std::unique_ptr<DIR, int (*)(DIR*)> dir(fdopendir(fd), closedir);
     if (!dir) {
       close(fd);
       return;
@@ -48,11 +50,11 @@ class Walk {
     // The whole listing first, so that only one folder is open at a time
     // however deep the walk goes.
     std::vector<std::pair<std::string, unsigned char>> entries;
-    while (dirent* entry = readdir(dir)) {
+    while (dirent* entry = readdir(dir.get())) {
       std::string_view name = entry->d_name;
       if (name != "." && name != "..") entries.emplace_back(name, entry->d_type);
     }
-    closedir(dir);
+    dir.reset();
 
     ancestors_.push_back({st.st_dev, st.st_ino});
     std::string base = path;

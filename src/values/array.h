@@ -13,7 +13,6 @@ class MutableArray;
 class Array : public Object {
  public:
   Array() = default;
-  Array(const Array&) = delete;
   ~Array() override;
 
   // An immutable array of the items, which share one allocation with it.
@@ -44,8 +43,9 @@ class Array : public Object {
   size_t count_ = 0;
 
  private:
-  void dispose() const noexcept override;
-  bool ownsBlock_ = false;
+  // Unsized: an immutable one is larger than its class.
+  void dispose() const noexcept override { destroyInBlock(); }
+  bool ownsBlock_ = false;  // its entries follow it in its own block
 };
 
 class MutableArray final : public Array {

@@ -13,16 +13,6 @@ Array::~Array() {
   if (ownsBlock_) std::destroy_n(items_, count_);
 }
 
-void Array::dispose() const noexcept {
-  if (!ownsBlock_) {
-    delete this;
-    return;
-  }
-  void* block = const_cast<Array*>(this);
-  this->~Array();
-  ::operator delete(block);
-}
-
 Ref<Array> Array::build(std::vector<Ref<Object>> items) { return build(std::span(items)); }
 
 Ref<Array> Array::build(std::span<Ref<Object>> items) {
@@ -82,6 +72,8 @@ void MutableArray::removeAt(size_t index) {
 namespace {
 constexpr size_t kLinearLimit = 8;
 constexpr uint32_t kTombstone = UINT32_MAX;
+// Positions and index sizes are 32-bit; no property list comes near this.
+constexpr size_t kMaxEntries = size_t(1) << 30;
 
 size_t keyHash(std::string_view key) {
   // Must agree with String::hash for the same text.
@@ -111,17 +103,7 @@ void checkPair(const Ref<Object>& key, const Ref<Object>& value) {
 }  // namespace
 
 Dictionary::~Dictionary() {
-  if (ownsBlock_) std::destroy_n(entries_, slots_);
-}
-
-void Dictionary::dispose() const noexcept {
-  if (!ownsBlock_) {
-    delete this;
-    return;
-  }
-  void* block = const_cast<Dictionary*>(this);
-  this->~Dictionary();
-  ::operator delete(block);
+  if (ownsBlock_) std::destroy_n(entries_, used_);
 }
 
 Ref<Dictionary> Dictionary::build(std::vector<std::pair<Ref<Object>, Ref<Object>>> pairs) {
@@ -130,7 +112,7 @@ Ref<Dictionary> Dictionary::build(std::vector<std::pair<Ref<Object>, Ref<Object>
 
 Ref<Dictionary> Dictionary::build(std::span<std::pair<Ref<Object>, Ref<Object>>> pairs) {
   size_t n = pairs.size();
-  if (n >= UINT32_MAX - 1) throw std::length_error("dictionary too large");
+  if (n > kMaxEntries) throw std::length_error("dictionary too large");
   // Sized for every pair: repeated keys, which leave some room unused, are rare.
   size_t indexSize = n > kLinearLimit ? indexSizeFor(n) : 0;
   static_assert(sizeof(Dictionary) % alignof(Entry) == 0 && alignof(Entry) >= alignof(uint32_t));
@@ -155,9 +137,9 @@ Ref<Dictionary> Dictionary::build(std::span<std::pair<Ref<Object>, Ref<Object>>>
       d->entries_[i].value = std::move(value);
       continue;
     }
-    new (d->entries_ + d->slots_) Entry{std::move(key), std::move(value), h};
-    if (indexSize) placeInIndex(d->index_, indexSize, h, d->slots_);
-    ++d->slots_;
+    new (d->entries_ + d->used_) Entry{std::move(key), std::move(value), h};
+    if (indexSize) placeInIndex(d->index_, indexSize, h, d->used_);
+    ++d->used_;
     ++d->live_;
   }
   return d;
@@ -184,7 +166,7 @@ Ref<MutableDictionary> Dictionary::mutableCopy() const {
 template <class Match>
 size_t Dictionary::find(size_t hash, Match&& match) const noexcept {
   if (indexSize_ == 0) {
-    for (size_t i = 0; i < slots_; ++i) {
+    for (size_t i = 0; i < used_; ++i) {
       const Entry& e = entries_[i];
       if (e.key && e.hash == hash && match(*e.key)) return i;
     }
@@ -214,7 +196,7 @@ size_t Dictionary::findText(std::string_view key) const noexcept {
   };
   if (indexSize_ == 0) {
     // A short list is searched by the text alone: hashing it would cost more.
-    for (size_t i = 0; i < slots_; ++i)
+    for (size_t i = 0; i < used_; ++i)
       if (entries_[i].key && matches(*entries_[i].key)) return i;
     return SIZE_MAX;
   }
@@ -259,18 +241,21 @@ std::string Dictionary::description() const {
 
 void MutableDictionary::sync() noexcept {
   entries_ = store_.data();
-  slots_ = static_cast<uint32_t>(store_.size());
+  used_ = static_cast<uint32_t>(store_.size());
   index_ = indexStore_.data();
   indexSize_ = static_cast<uint32_t>(indexStore_.size());
 }
 
 void MutableDictionary::rebuildIndex() {
+  // Dropped first: should the new index fail to allocate, the entries are
+  // still found by searching them in order.
   indexStore_.clear();
-  if (live_ > kLinearLimit) {
-    indexStore_.assign(indexSizeFor(live_), 0);
-    for (size_t i = 0; i < store_.size(); ++i)
-      if (store_[i].key) placeInIndex(indexStore_.data(), indexStore_.size(), store_[i].hash, i);
-  }
+  sync();
+  if (live_ <= kLinearLimit) return;
+  std::vector<uint32_t> index(indexSizeFor(live_), 0);
+  for (size_t i = 0; i < store_.size(); ++i)
+    if (store_[i].key) placeInIndex(index.data(), index.size(), store_[i].hash, i);
+  indexStore_ = std::move(index);
   sync();
 }
 
@@ -287,7 +272,7 @@ void MutableDictionary::set(Ref<Object> key, Ref<Object> value) {
     store_[i].value = std::move(value);
     return;
   }
-  if (store_.size() >= UINT32_MAX - 1) throw std::length_error("dictionary too large");
+  if (store_.size() >= kMaxEntries) throw std::length_error("dictionary too large");
   store_.push_back({std::move(key), std::move(value), h});
   ++live_;
   sync();

@@ -62,7 +62,7 @@ class Dictionary : public Object {
   std::string description() const override;
 
  protected:
-  std::span<const Entry> entries() const noexcept { return {entries_, slots_}; }
+  std::span<const Entry> entries() const noexcept { return {entries_, used_}; }
   template <class Match>
   size_t find(size_t hash, Match&& match) const noexcept;
   // The position of the entry whose key is a string of this text, or SIZE_MAX.
@@ -71,14 +71,15 @@ class Dictionary : public Object {
   // What the lookups read: the block after an immutable dictionary, or the
   // storage of a mutable one, which points here again after every change.
   Entry* entries_ = nullptr;
-  uint32_t slots_ = 0;  // entries in use, removed ones included
+  uint32_t used_ = 0;  // entries in use, removed ones included
   uint32_t live_ = 0;
   uint32_t* index_ = nullptr;  // entry position + 1; 0 empty; kTombstone removed
   uint32_t indexSize_ = 0;     // a power of two, or 0 for a short list searched in order
 
  private:
-  void dispose() const noexcept override;
-  bool ownsBlock_ = false;
+  // Unsized: an immutable one is larger than its class.
+  void dispose() const noexcept override { destroyInBlock(); }
+  bool ownsBlock_ = false;  // its entries follow it in its own block
 };
 
 class MutableDictionary final : public Dictionary {

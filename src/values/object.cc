@@ -10,6 +10,12 @@ std::string Object::description() const {
   return buf;
 }
 
+void Object::destroyInBlock() const noexcept {
+  void* block = const_cast<Object*>(this);
+  this->~Object();  // virtual: the whole object goes
+  ::operator delete(block);
+}
+
 std::string describe(const Object* o) { return o ? o->description() : "(null)"; }
 
 }  // namespace qr

@@ -55,6 +55,9 @@ class Object {
   // Frees the object once the last reference is gone; objects allocated with
   // trailing storage override it to free that storage the way it was taken.
   virtual void dispose() const noexcept { delete this; }
+  // dispose() for objects placed at the start of a block taken with
+  // ::operator new, their trailing storage after them.
+  void destroyInBlock() const noexcept;
 
  private:
   static constexpr uint32_t kImmortal = UINT32_MAX;

@@ -27,10 +27,7 @@ class StoredString final : public String {
   Ref<String> copy() const override { return Ref<String>(const_cast<StoredString*>(this)); }
 
  protected:
-  void dispose() const noexcept override {
-    this->~StoredString();
-    ::operator delete(const_cast<StoredString*>(this));
-  }
+  void dispose() const noexcept override { destroyInBlock(); }
 
  private:
   StoredString() = default;
