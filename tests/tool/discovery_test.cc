@@ -57,8 +57,8 @@ TEST(Discovery, EachCaseFindsExactlyItsModules) {
        "P", "", "b:P/V/Br.plugin i:P/V/IO.plugin p:P/A.plugin"},
       {"p:P/A.plugin", "P", "", "", 200, "yes"},
       {"p:P/Foo/A.plugin p:P/Foobar/B.plugin p:P/Old/C.plugin p:P/V/Old/D/E.plugin "
-       "p:P/Older/F.plugin",
-       "P", "P/Foo */Old/*", "p:P/Foobar/B.plugin p:P/Older/F.plugin"},
+       "p:P/Older/F.plugin p:P/Skip/G.plugin",
+       "P", "P/Foo */Old/* */Skip", "p:P/Foobar/B.plugin p:P/Older/F.plugin"},
       {"p:P/Foo/A.plugin", "P/Foo/", "P/Foo", "p:P/Foo/A.plugin"},
       {"p:E/Real.plugin p:P/Here.plugin l:P/Link.plugin=E/Real.plugin l:P/loop=P", "P", "",
        "p:P/Here.plugin p:P/Link.plugin"},
@@ -67,6 +67,7 @@ TEST(Discovery, EachCaseFindsExactlyItsModules) {
       {"p:R/One.plugin p:R/a/Two.plugin p:R/a/b/Three.plugin", "R", "", "p:R/One.plugin", 2},
       {"p:R/One.plugin p:R/a/Two.plugin p:R/a/b/Three.plugin", "R", "",
        "p:R/One.plugin p:R/a/Two.plugin", 3},
+      {"p:E/Real.plugin l:R/a/Link.plugin=E/Real.plugin", "R", "", "p:R/a/Link.plugin", 3},
       {"p:Root.plugin", "Root.plugin", "", "p:Root.plugin"},
       {"p:P/A.plugin", "", "", ""},  // no search settings at all
   };
