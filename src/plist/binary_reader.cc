@@ -231,12 +231,8 @@ class BinaryReader {
         items_.push_back(std::move(v));
       }
       auto items = std::span(items_).subspan(base);
-      Ref<Object> a;
-      if (mutableContainers)
-        a = make<MutableArray>(std::vector<Ref<Object>>(std::make_move_iterator(items.begin()),
-                                                        std::make_move_iterator(items.end())));
-      else
-        a = Array::build(items);
+      Ref<Object> a = mutableContainers ? Ref<Object>(MutableArray::build(items))
+                                        : Ref<Object>(Array::build(items));
       items_.resize(base);
       return a;
     }
@@ -254,15 +250,8 @@ class BinaryReader {
       pairs_.emplace_back(std::move(k), std::move(v));
     }
     auto pairs = std::span(pairs_).subspan(base);
-    Ref<Object> d;
-    if (!mutableContainers) {
-      d = Dictionary::build(pairs);
-    } else {
-      auto m = make<MutableDictionary>();
-      m->reserve(pairs.size());
-      for (auto& [k, v] : pairs) m->set(std::move(k), std::move(v));  // a repeated key: last wins
-      d = std::move(m);
-    }
+    Ref<Object> d = mutableContainers ? Ref<Object>(MutableDictionary::build(pairs))
+                                      : Ref<Object>(Dictionary::build(pairs));
     pairs_.resize(base);
     return d;
   }

@@ -148,8 +148,6 @@ class BinaryWriter {
   // Longer strings are rarely repeated, and hashing them all would cost more
   // than their sharing saves.
   static constexpr size_t kSharedStringLength = 32;
-  // How far a lookup probes before it gives up sharing the string.
-  static constexpr size_t kMaxProbes = 32;
 
   size_t add(const Object& v, size_t bytes);
   size_t shared(const String& s);
@@ -192,7 +190,7 @@ size_t BinaryWriter::shared(const String& s) {
           : std::string_view(reinterpret_cast<const char*>(s.wide().data()), 2 * s.wide().size());
   uint64_t h = quickTextHash(units);
   size_t mask = strings_.size() - 1, item = 0;
-  for (size_t i = h & mask, probes = 0; probes < kMaxProbes; i = (i + 1) & mask, ++probes) {
+  for (size_t i = h & mask, probes = 0; probes < kMaxSharingProbes; i = (i + 1) & mask, ++probes) {
     StringSlot& slot = strings_[i];
     if (!slot.item) {
       slot = {h, add(s, stringSize(s))};

@@ -5,12 +5,17 @@
 // rather than slowing down, when text collides.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <cstring>
 #include <string_view>
 #include <vector>
 
 namespace qr {
+
+// How far a lookup probes before it gives up sharing the text: crafted text
+// that collides costs room, never a parse or write turned quadratic.
+inline constexpr size_t kMaxSharingProbes = 32;
 
 inline uint64_t quickTextHash(std::string_view s) noexcept {
   uint64_t h = 0x9E3779B97F4A7C15ull ^ s.size();

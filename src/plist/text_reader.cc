@@ -258,10 +258,7 @@ class TextParser {
 
   Ref<Object> dictionary(Pairs pairs) {
     if (!mutableContainers_) return Dictionary::build(std::move(pairs));
-    auto d = make<MutableDictionary>();
-    d->reserve(pairs.size());
-    for (auto& [k, v] : pairs) d->set(std::move(k), std::move(v));  // a repeated key: last wins
-    return d;
+    return MutableDictionary::build(pairs);
   }
 
   std::u16string_view text_;

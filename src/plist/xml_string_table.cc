@@ -5,14 +5,6 @@
 #include "plist/sharing_table.h"
 
 namespace qr::xmlplist {
-namespace {
-
-// Crafted text could make many strings collide; a lookup that has probed
-// this far gives up sharing rather than let the parse turn quadratic.
-constexpr size_t kMaxProbes = 32;
-
-}  // namespace
-
 StringTable::~StringTable() {
   for (Slot& s : slots_)
     if (s.string) s.string->release();
@@ -33,7 +25,7 @@ Ref<String> StringTable::intern(std::string_view ascii) {
   uint64_t h = quickTextHash(ascii);
   size_t mask = slots_.size() - 1;
   size_t i = h & mask;
-  for (size_t probes = 0; probes < kMaxProbes; ++probes, i = (i + 1) & mask) {
+  for (size_t probes = 0; probes < kMaxSharingProbes; ++probes, i = (i + 1) & mask) {
     Slot& slot = slots_[i];
     if (!slot.string) break;
     if (slot.hash == h && slot.string->narrow() == ascii) {

@@ -81,30 +81,18 @@ Ref<Object> ValueBuilder::leafValue(std::string_view text) {
 
 Ref<Object> ValueBuilder::closeArray(size_t start) {
   auto items = std::span(values_).subspan(start);
-  Ref<Object> a;
-  if (mutableContainers_)
-    a = qr::make<MutableArray>(std::vector<Ref<Object>>(std::make_move_iterator(items.begin()),
-                                                        std::make_move_iterator(items.end())));
-  else
-    a = qr::Array::build(items);
+  Ref<Object> a = mutableContainers_ ? Ref<Object>(MutableArray::build(items))
+                                     : Ref<Object>(qr::Array::build(items));
   values_.resize(start);
   return a;
 }
 
 Ref<Object> ValueBuilder::closeDictionary(size_t start) {
-  size_t n = (values_.size() - start) / 2;
-  if (mutableContainers_) {
-    auto d = qr::make<MutableDictionary>();
-    d->reserve(n);
-    for (size_t i = start; i < values_.size(); i += 2)
-      d->set(std::move(values_[i]), std::move(values_[i + 1]));
-    values_.resize(start);
-    return d;
-  }
   pairs_.clear();
   for (size_t i = start; i < values_.size(); i += 2)
     pairs_.emplace_back(std::move(values_[i]), std::move(values_[i + 1]));
   values_.resize(start);
+  if (mutableContainers_) return MutableDictionary::build(pairs_);
   return Dictionary::build(std::span(pairs_));
 }
 

@@ -52,6 +52,8 @@ class MutableArray final : public Array {
  public:
   MutableArray() = default;
   explicit MutableArray(std::vector<Ref<Object>> items) : store_(std::move(items)) { sync(); }
+  // Moves the items out of a buffer the caller keeps using.
+  static Ref<MutableArray> build(std::span<Ref<Object>> items);
 
   void append(Ref<Object> value) {
     store_.push_back(std::move(value));

@@ -1,4 +1,5 @@
 #include <algorithm>
+#include <iterator>
 #include <memory>
 #include <new>
 #include <stdexcept>
@@ -50,6 +51,11 @@ std::string Array::description() const {
     out += describe(items_[i].get());
   }
   return out + ")";
+}
+
+Ref<MutableArray> MutableArray::build(std::span<Ref<Object>> items) {
+  return qr::make<MutableArray>(std::vector<Ref<Object>>(std::make_move_iterator(items.begin()),
+                                                         std::make_move_iterator(items.end())));
 }
 
 void MutableArray::insert(size_t index, Ref<Object> value) {
@@ -289,6 +295,14 @@ void MutableDictionary::set(Ref<Object> key, Ref<Object> value) {
     return;
   }
   placeInIndex(indexStore_.data(), indexStore_.size(), h, store_.size() - 1);
+}
+
+Ref<MutableDictionary> MutableDictionary::build(
+    std::span<std::pair<Ref<Object>, Ref<Object>>> pairs) {
+  auto d = qr::make<MutableDictionary>();
+  d->reserve(pairs.size());
+  for (auto& [key, value] : pairs) d->set(std::move(key), std::move(value));
+  return d;
 }
 
 void MutableDictionary::set(std::string_view key, Ref<Object> value) {

@@ -88,10 +88,7 @@ Ref<Object> copy(const Object& v, Mutability m, size_t depth) {
       });
       if (!ok) return nullptr;
       if (!mutableContainers) return Dictionary::build(std::move(pairs));
-      auto out = qr::make<MutableDictionary>();
-      out->reserve(pairs.size());
-      for (auto& [k, value] : pairs) out->set(std::move(k), std::move(value));
-      return out;
+      return MutableDictionary::build(pairs);
     }
     default:
       return nullptr;

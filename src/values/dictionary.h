@@ -85,6 +85,9 @@ class Dictionary : public Object {
 class MutableDictionary final : public Dictionary {
  public:
   MutableDictionary() = default;
+  // Moves the pairs out of a buffer the caller keeps using; a repeated key
+  // keeps its first position and its last value, as set() does.
+  static Ref<MutableDictionary> build(std::span<std::pair<Ref<Object>, Ref<Object>>> pairs);
   // Replaces the value of an equal key in place, keeping its position.
   void set(Ref<Object> key, Ref<Object> value);
   void set(std::string_view key, Ref<Object> value);
