@@ -337,6 +337,21 @@ TEST(PropertyList, EveryReaderBoundsNestingAndBinaryResultsShareNothingMutable) 
   auto objects = chain(kMaxPropertyListDepth, 2);
   objects[0] = refs(0xA, {kMaxPropertyListDepth - 1, 1}, 2);
   EXPECT_EQ(modesReading(bplist(objects, 2)), 0);
+  // Keys count towards what a file may expand to: a dictionary of 1,000 keys
+  // referenced R times makes 2,001 R nodes. 700 references pass the room of an
+  // immutable result (four nodes a byte of the file and a million more), 35
+  // that of a mutable one (four a byte and 4,096 more).
+  auto keyed = [](size_t references) {
+    std::vector<uint64_t> dict, top(references, 1);
+    for (uint64_t k = 0; k < 1000; ++k) dict.push_back(2 + k);
+    dict.insert(dict.end(), 1000, 1002);
+    std::vector<std::string> objects{refs(0xA, top, 2), refs(0xD, dict, 2)};
+    for (int k = 0; k < 1000; ++k) objects.push_back(ascii("k" + std::to_string(k)));
+    objects.push_back(ascii("v"));
+    return bplist(objects, 2);
+  };
+  EXPECT_EQ(modesReading(keyed(700)), 0);
+  EXPECT_EQ(modesReading(keyed(35)), 1);
   // Mutable results share nothing mutable: a dictionary and a string each referenced twice.
   auto file = bplist({refs(0xA, {1, 1, 3, 3}), refs(0xD, {2, 3}), ascii("k"), ascii("v")});
   auto m = cast<Array>(readBinaryPropertyList(file, Mutability::MutableContainersAndLeaves));
